@@ -21,6 +21,11 @@ if(VELA_SANITIZE)
   target_link_options(vela_options INTERFACE -fsanitize=${VELA_SANITIZE} -fno-sanitize-recover=all)
 endif()
 
+if(VELA_FUZZERS)
+  # The libraries under test must count their branches too, or libFuzzer searches blindly.
+  target_compile_options(vela_options INTERFACE -fsanitize=fuzzer-no-link)
+endif()
+
 if(VELA_HARDENING)
   set(CMAKE_POSITION_INDEPENDENT_CODE ON)
   target_compile_options(vela_options INTERFACE -fstack-protector-strong -fstack-clash-protection -fcf-protection

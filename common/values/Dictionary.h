@@ -24,6 +24,8 @@ class Array {
 public:
     /// No values.
     Array() = default;
+    /// `Array{1, "two"}`. One array as the only element is written `Array{Value(inner)}`: compilers take `Array{inner}`
+    /// for a copy or for a nesting as they like.
     Array(std::initializer_list<Value> values);
     Array(const Array& other) : object_(other.object_) { detail::retain(object_); }
     Array(Array&& other) noexcept : object_(std::exchange(other.object_, nullptr)) {}

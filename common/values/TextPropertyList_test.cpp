@@ -2,12 +2,9 @@
 #include "common/values/TextualForm.h"
 
 #include <gtest/gtest.h>
-#include <ostream>
 #include <string>
 
 namespace vela {
-
-void PrintTo(const Value& value, std::ostream* stream) { *stream << textualForm(value); }
 
 namespace {
 

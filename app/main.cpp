@@ -1,0 +1,74 @@
+// vela-reportingd: wiring only.
+#include "app/CommandLine.h"
+#include "app/ServiceCheck.h"
+#include "app/ServicePlatform.h"
+#include "platform/host/HostFacts.h"
+#include "platform/linux/LinuxFileSystem.h"
+#include "platform/toml/SettingsLoading.h"
+
+#include <chrono>
+#include <csignal>
+#include <cstdlib>
+#include <iostream>
+
+namespace {
+
+using namespace vela;
+
+constexpr int kWrongUsage = 64;
+constexpr int kWrongSettings = 78;
+
+/// Nothing that the check posts takes longer on a working device, however loaded.
+constexpr std::chrono::seconds kPatience{30};
+
+int refuseUsage(std::string_view reason) {
+    std::cerr << "vela-reportingd: " << reason << '\n';
+    return kWrongUsage;
+}
+
+int print(std::string_view text, int status) {
+    std::cout << text << std::flush;
+    return std::cout ? status : EXIT_FAILURE;
+}
+
+int check(const CommandLine& line) {
+    const platform::LinuxFileSystem files;
+    const platform::LoadedSettings loaded =
+        platform::loadSettings({line.settingsFile, line.settings, platform::processEnvironment()}, files);
+    if (!loaded.reading.settings) {
+        for (const SettingError& error : loaded.reading.errors) {
+            std::cerr << error.text() << '\n';
+        }
+        return kWrongSettings;
+    }
+    const Settings& settings = *loaded.reading.settings;
+    ServicePlatform platform(settings);
+    CheckedFacts facts = platform.facts(settings);
+    facts.settingsFile = loaded.file;
+    facts.singleSettings = line.settings.size();
+    const std::vector<CheckFinding> findings = checkService(settings, platform.parts(), facts, kPatience);
+    return print(line.json ? findingsAsJson(findings) : findingsAsText(findings),
+                 isSomethingMissing(findings) ? EXIT_FAILURE : EXIT_SUCCESS);
+}
+
+} // namespace
+
+int main(int argumentCount, char** arguments) {
+    std::signal(SIGPIPE, SIG_IGN);
+    const std::vector<std::string_view> given(arguments + (argumentCount > 0 ? 1 : 0), arguments + argumentCount);
+    const platform::Result<CommandLine> line = readCommandLine(given);
+    if (!line) {
+        return refuseUsage(line.failure().description + "; see --help");
+    }
+    switch (line->action) {
+    case CommandLine::Action::Help:
+        return print(helpText(), EXIT_SUCCESS);
+    case CommandLine::Action::Version:
+        return print("vela-reportingd " VELA_VERSION "\n", EXIT_SUCCESS);
+    case CommandLine::Action::Check:
+        return check(*line);
+    case CommandLine::Action::Serve:
+        return refuseUsage("the serving part is not in this version, which only offers --check; see --help");
+    }
+    return EXIT_FAILURE;
+}

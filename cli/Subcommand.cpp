@@ -1,0 +1,79 @@
+#include "cli/Subcommand.h"
+
+#include "common/SettingValues.h"
+
+#include <algorithm>
+#include <array>
+#include <ostream>
+#include <string>
+
+namespace vela {
+
+namespace {
+
+constexpr std::array<Subcommand, 2> kSubcommands{{
+    {"settings", "[--settings FILE] [--set SECTION.KEY=VALUE]... [--json | --example]",
+     "the settings in force and where each comes from", runSettings},
+    {"plist", "FILE [--to json|xml|binary|text]", "prints a property list in another form", runPlist},
+}};
+
+constexpr std::size_t kNameColumns = 12;
+
+const Subcommand* findSubcommand(std::string_view name) {
+    const auto* found = std::ranges::find(kSubcommands, name, &Subcommand::name);
+    return found == kSubcommands.end() ? nullptr : found;
+}
+
+std::string usageOf(const Subcommand& subcommand) {
+    return "velactl " + std::string(subcommand.name) + " " + std::string(subcommand.arguments);
+}
+
+void printHelp(std::ostream& out) {
+    out << "usage: velactl SUBCOMMAND [ARGUMENT]...\n\nClient and inspector of the Vela reporting service.\n\n";
+    for (const Subcommand& subcommand : kSubcommands) {
+        std::string name(subcommand.name);
+        name.resize(kNameColumns, ' ');
+        out << "  " << name << subcommand.summary << "\n  " << std::string(kNameColumns, ' ') << usageOf(subcommand)
+            << "\n";
+    }
+    out << "\n  --version   prints the version\n  --help      prints this text\n\n"
+           "Exit status: 0 done, 1 failed, 2 wrong usage, 3 no service.\n";
+}
+
+} // namespace
+
+std::span<const Subcommand> subcommands() { return kSubcommands; }
+
+int refuseUsage(std::string_view subcommand, std::string_view reason, Console& console) {
+    const Subcommand* known = findSubcommand(subcommand);
+    console.error << "velactl: " << reason << "; "
+                  << (known == nullptr ? std::string("see velactl --help") : "usage: " + usageOf(*known)) << '\n';
+    return kWrongUsage;
+}
+
+int runVelactl(std::span<const std::string_view> arguments, Console& console) {
+    if (arguments.empty()) {
+        return refuseUsage("", "a subcommand is missing", console);
+    }
+    const std::string_view name = arguments.front();
+    if (name == "--help") {
+        printHelp(console.out);
+        return kDone;
+    }
+    if (name == "--version") {
+        console.out << "velactl " VELA_VERSION "\n";
+        return kDone;
+    }
+    const Subcommand* subcommand = findSubcommand(name);
+    if (subcommand == nullptr) {
+        return refuseUsage("", "there is no subcommand " + escapedText(name), console);
+    }
+    const auto rest = arguments.subspan(1);
+    if (std::ranges::find(rest.begin(), std::ranges::find(rest, "--"), "--help") != std::ranges::find(rest, "--")) {
+        console.out << "usage: " << usageOf(*subcommand) << "\n\n" << subcommand->summary << '\n';
+        return kDone;
+    }
+    return subcommand->run(rest, console);
+}
+
+} // namespace vela

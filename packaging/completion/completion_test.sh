@@ -1,0 +1,50 @@
+#!/usr/bin/env bash
+# Asks the completions what they offer, as the shell would.
+set -uo pipefail
+here=$(dirname -- "$(readlink -f -- "$0")")
+# shellcheck source=packaging/completion/velactl
+source "$here/velactl"
+# shellcheck source=packaging/completion/vela-reportingd
+source "$here/vela-reportingd"
+
+# Without an installed velactl: what `velactl settings --json` begins with.
+# shellcheck disable=SC2317  # the completions call it
+velactl() {
+    printf '%s\n' '{"key":"log.target","value":"journal","origin":"default"}' \
+        '{"key":"log.level","value":"debug","origin":"file","file":"/x","line":2}'
+}
+
+status=0
+# offers FUNCTION EXPECTED WORD...: the words so far, the last one being typed; EXPECTED has one space between offers.
+offers() {
+    local function=$1 expected=$2
+    shift 2
+    COMP_WORDS=("$@")
+    COMP_CWORD=$(($# - 1))
+    COMPREPLY=()
+    "$function"
+    if [[ ${COMPREPLY[*]} != "$expected" ]]; then
+        printf '%s: offered "%s" in place of "%s"\n' "$*" "${COMPREPLY[*]}" "$expected"
+        status=1
+    fi
+}
+
+folder=$(mktemp -d)
+trap 'rm -rf -- "$folder"' EXIT
+: >"$folder/one file.toml"
+
+offers _velactl "settings plist --help --version" velactl ""
+offers _velactl "settings" velactl se
+offers _velactl "--settings --set" velactl settings --set
+offers _velactl "log.target= log.level=" velactl settings --set ""
+offers _velactl "log.level=" velactl settings --set log.l
+offers _velactl "$folder/one file.toml" velactl settings --settings "$folder/o"
+offers _velactl "json xml binary text" velactl plist x --to ""
+offers _velactl "xml" velactl plist x --to x
+offers _velactl "--to" velactl plist --t
+offers _velactl "$folder/one file.toml" velactl plist "$folder/one"
+offers _vela_reportingd "--check --json --settings --set --version --help" vela-reportingd ""
+offers _vela_reportingd "--check" vela-reportingd --c
+offers _vela_reportingd "$folder/one file.toml" vela-reportingd --check --settings "$folder/"
+offers _vela_reportingd "log.target=" vela-reportingd --check --set log.t
+exit "$status"

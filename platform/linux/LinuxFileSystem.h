@@ -1,0 +1,22 @@
+// Files and folders of the operating system. Without state, so thread-safe.
+#pragma once
+
+#include "platform/FileSystem.h"
+
+namespace vela::platform {
+
+class LinuxFileSystem final : public FileSystem {
+public:
+    Result<std::string> readFile(const std::string& path, std::size_t limit) const override;
+
+    /// The new file is named ".vela-" and sixteen random hexadecimal digits until it is renamed; a crash may leave one
+    /// behind. The content is on the disk before the name is, and the name before this answers.
+    Result<Done> writeFileAtomically(const std::string& path, std::string_view content,
+                                     std::uint32_t permissions) override;
+
+    Result<Done> createDirectories(const std::string& path, std::uint32_t permissions) override;
+
+    std::string currentDirectory() const override;
+};
+
+} // namespace vela::platform

@@ -1,0 +1,140 @@
+#include "platform/linux/LinuxWorkQueues.h"
+#include "platform/linux/WorkQueueTestTools.h"
+#include "testing/WorkQueueContract.h"
+
+#include <atomic>
+#include <chrono>
+#include <fstream>
+#include <functional>
+#include <future>
+#include <gtest/gtest.h>
+#include <string>
+#include <vector>
+
+namespace vela::platform {
+
+namespace {
+
+using namespace std::chrono_literals;
+using vela::testing::Record;
+
+std::string threadName() {
+    std::string name;
+    std::getline(std::ifstream("/proc/thread-self/comm"), name);
+    return name;
+}
+
+TEST(LinuxWorkQueuesQualityTest, AThreadBearsTheNameOfTheQueueThatItServes) {
+    std::promise<std::string> inSession;
+    std::promise<std::string> inTracing;
+    std::promise<std::string> inBackground;
+    LinuxWorkQueues queues(1);
+    const auto session = queues.makeSerialQueue("com.orvex.vela.session.beaconreporting", QualityOfService::Utility);
+    const auto tracing = queues.makeSerialQueue("Tracing Queue", QualityOfService::Default);
+    session->post([&inSession] { inSession.set_value(threadName()); });
+    EXPECT_EQ(inSession.get_future().get(), "beaconreporting");
+    tracing->post([&inTracing] { inTracing.set_value(threadName()); });
+    EXPECT_EQ(inTracing.get_future().get(), "Tracing Queue");
+    queues.background().post([&inBackground] { inBackground.set_value(threadName()); });
+    EXPECT_EQ(inBackground.get_future().get(), "vela.background");
+}
+
+TEST(LinuxWorkQueuesQualityTest, ATimerIsServedBesideAQueueThatNeverEnds) {
+    std::atomic<bool> ran = false;
+    std::function<void()> again;
+    LinuxWorkQueues queues(1);
+    const auto busy = queues.makeSerialQueue("busy", QualityOfService::UserInteractive);
+    const auto delayed = queues.makeSerialQueue("delayed", QualityOfService::Background);
+    again = [&] { busy->post([&again] { again(); }); };
+    busy->post([&again] { again(); });
+    delayed->postAfter(5ms, [&ran] { ran = true; });
+    EXPECT_TRUE(waitFor([&ran] { return ran.load(); }));
+}
+
+TEST(LinuxWorkQueuesQualityTest, MoreUrgentQueuesAreServedFirst) {
+    Record record;
+    Gate gate;
+    LinuxWorkQueues queues(1);
+    const auto holding = queues.makeSerialQueue("holding", QualityOfService::UserInteractive);
+    const auto background = queues.makeSerialQueue("background", QualityOfService::Background);
+    const auto utility = queues.makeSerialQueue("utility", QualityOfService::Utility);
+    const auto standard = queues.makeSerialQueue("standard", QualityOfService::Default);
+    const auto urgent = queues.makeSerialQueue("urgent", QualityOfService::UserInteractive);
+    holding->post(gate.item());
+    ASSERT_TRUE(gate.isReachedBy(1));
+    background->post([&record] { record.add(4); });
+    utility->post([&record] { record.add(3); });
+    standard->post([&record] { record.add(2); });
+    urgent->post([&record] { record.add(1); });
+    gate.open();
+    EXPECT_TRUE(waitFor([&record] { return record.size() == 4; }));
+    EXPECT_EQ(record.numbers(), (std::vector{1, 2, 3, 4}));
+}
+
+TEST(LinuxWorkQueuesQualityTest, AQueueMakesWayForAMoreUrgentOneBetweenItsItems) {
+    Record record;
+    Gate gate;
+    LinuxWorkQueues queues(1);
+    const auto utility = queues.makeSerialQueue("utility", QualityOfService::Utility);
+    const auto urgent = queues.makeSerialQueue("urgent", QualityOfService::UserInteractive);
+    utility->post(gate.item());
+    utility->post([&record] { record.add(2); });
+    ASSERT_TRUE(gate.isReachedBy(1));
+    urgent->post([&record] { record.add(1); });
+    gate.open();
+    EXPECT_TRUE(waitFor([&record] { return record.size() == 2; }));
+    EXPECT_EQ(record.numbers(), (std::vector{1, 2}));
+}
+
+TEST(LinuxWorkQueuesQualityTest, BackgroundWorkIsServedBesideUrgentWorkThatNeverEnds) {
+    std::atomic<int> ran = 0;
+    std::function<void()> again;
+    LinuxWorkQueues queues(1);
+    const auto urgent = queues.makeSerialQueue("urgent", QualityOfService::UserInteractive);
+    again = [&] { urgent->post([&again] { again(); }); };
+    urgent->post([&again] { again(); });
+    for (int i = 0; i < 10; ++i) {
+        queues.background().post([&ran] { ++ran; });
+    }
+    EXPECT_TRUE(waitFor([&ran] { return ran == 10; }));
+}
+
+TEST(LinuxWorkQueuesQualityTest, ABusyQueueLetsItsEqualsHaveTheirTurn) {
+    Record record;
+    Gate gate;
+    LinuxWorkQueues queues(1);
+    const auto busy = queues.makeSerialQueue("busy", QualityOfService::Default);
+    const auto other = queues.makeSerialQueue("other", QualityOfService::Default);
+    busy->post(gate.item());
+    ASSERT_TRUE(gate.isReachedBy(1));
+    for (int i = 0; i < 1'000; ++i) {
+        busy->post([&record] { record.add(1); });
+    }
+    other->post([&record] { record.add(2); });
+    gate.open();
+    EXPECT_TRUE(waitFor([&record] { return record.size() == 1'001; }));
+    EXPECT_EQ(record.numbers()[63], 2); // the gate and 63 items were the busy queue's share
+}
+
+TEST(LinuxWorkQueuesQualityTest, ThreadsTakeOnTheNiceValueOfTheirQueueWhereTheyMay) {
+    LinuxWorkQueues queues(1);
+    const int base = threadNice();
+    const auto niceIn = [&queues](QualityOfService quality) {
+        std::promise<int> nice;
+        const auto queue = queues.makeSerialQueue("queue", quality);
+        queue->post([&nice] { nice.set_value(threadNice()); });
+        return nice.get_future().get();
+    };
+    const auto expected = [&](QualityOfService quality) {
+        return queues.appliesThreadPriorities() ? niceFor(quality, base) : base;
+    };
+    for (const auto quality : {QualityOfService::Background, QualityOfService::UserInteractive,
+                               QualityOfService::Utility, QualityOfService::Default}) {
+        EXPECT_EQ(niceIn(quality), expected(quality));
+    }
+    EXPECT_EQ(threadNice(), base);
+}
+
+} // namespace
+
+} // namespace vela::platform

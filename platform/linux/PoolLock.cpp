@@ -1,0 +1,40 @@
+#include "platform/linux/PoolLock.h"
+
+#include "platform/linux/Worker.h"
+#include "platform/linux/WorkerPool.h"
+
+namespace vela::platform {
+
+PoolLock::PoolLock(WorkerPool& pool) : lock_(pool.mutex_) {}
+
+void PoolLock::unlock() {
+    if (lock_.owns_lock()) {
+        lock_.unlock();
+    }
+    wakeNow();
+}
+
+bool PoolLock::wait(std::condition_variable& condition, const std::optional<MonotonicTime>& deadline) {
+    wakeNow();
+    if (!deadline || *deadline == MonotonicTime::max()) {
+        condition.wait(lock_);
+        return true;
+    }
+    return condition.wait_until(lock_, *deadline) == std::cv_status::no_timeout;
+}
+
+void PoolLock::wakeOnUnlock(Worker& worker) {
+    if (wakeCount_ == wakes_.size()) {
+        worker.wake.notify_one();
+        return;
+    }
+    wakes_[wakeCount_++] = &worker;
+}
+
+void PoolLock::wakeNow() {
+    for (; wakeCount_ > 0; --wakeCount_) {
+        wakes_[wakeCount_ - 1]->wake.notify_one();
+    }
+}
+
+} // namespace vela::platform

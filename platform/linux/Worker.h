@@ -1,0 +1,27 @@
+// One thread of a worker pool. Confined to it, save for what the pool's lock guards. Lives as long as its pool.
+#pragma once
+
+#include "platform/linux/ThreadAttributes.h"
+
+#include <condition_variable>
+#include <thread>
+
+namespace vela::platform {
+
+class QueueCore;
+class WorkerPool;
+
+struct Worker {
+    // Guarded by the pool's lock:
+    std::condition_variable wake;
+    bool woken = false;
+    std::thread thread;
+
+    // The thread's own:
+    WorkerPool* pool = nullptr;
+    const QueueCore* queue = nullptr; // being served
+    unsigned blockingDepth = 0;
+    ThreadAppearance appearance;
+};
+
+} // namespace vela::platform

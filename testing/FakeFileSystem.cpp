@@ -1,0 +1,167 @@
+#include "testing/FakeFileSystem.h"
+
+#include <cassert>
+#include <cerrno>
+#include <system_error>
+#include <utility>
+
+namespace vela::testing {
+
+namespace {
+
+platform::Failure failureOf(std::string_view operation, const std::string& path, int code) {
+    return {code, std::string(operation) + " " + path + ": " + std::generic_category().message(code)};
+}
+
+/// Without slashes at its end; "/" stays.
+std::string tidy(const std::string& path) {
+    const auto last = path.find_last_not_of('/');
+    return last == std::string::npos ? path.substr(0, 1) : path.substr(0, last + 1);
+}
+
+std::string folderOf(const std::string& path) {
+    const auto slash = path.rfind('/');
+    return slash == 0 || slash == std::string::npos ? "/" : path.substr(0, slash);
+}
+
+} // namespace
+
+FakeFileSystem::FakeFileSystem() {
+    const MutexLock lock(mutex_);
+    nodes_["/"] = Node{std::nullopt, 0755};
+}
+
+void FakeFileSystem::addFile(const std::string& path, std::string content, std::uint32_t permissions) {
+    const MutexLock lock(mutex_);
+    [[maybe_unused]] const int error = makeFolders(folderOf(path), 0755);
+    assert(error == 0);
+    nodes_[path] = Node{std::move(content), permissions};
+}
+
+void FakeFileSystem::setCurrentDirectory(std::string path) {
+    const MutexLock lock(mutex_);
+    currentDirectory_ = std::move(path);
+}
+
+void FakeFileSystem::failOn(const std::string& path, int error) {
+    const MutexLock lock(mutex_);
+    errors_[path] = error;
+}
+
+std::optional<std::string> FakeFileSystem::contentOf(const std::string& path) const {
+    const MutexLock lock(mutex_);
+    const Node* const node = find(path);
+    return node == nullptr ? std::nullopt : node->content;
+}
+
+std::optional<std::uint32_t> FakeFileSystem::permissionsOf(const std::string& path) const {
+    const MutexLock lock(mutex_);
+    const Node* const node = find(path);
+    return node == nullptr ? std::nullopt : std::optional(node->permissions);
+}
+
+std::vector<std::string> FakeFileSystem::files() const {
+    const MutexLock lock(mutex_);
+    std::vector<std::string> paths;
+    for (const auto& [path, node] : nodes_) {
+        if (node.content) {
+            paths.push_back(path);
+        }
+    }
+    return paths;
+}
+
+platform::Result<std::string> FakeFileSystem::readFile(const std::string& path, std::size_t limit) const {
+    const MutexLock lock(mutex_);
+    if (const int error = errorFor(path); error != 0) {
+        return failureOf("read", path, error);
+    }
+    const Node* const node = find(path);
+    if (node == nullptr) {
+        return failureOf("open", path, ENOENT);
+    }
+    if (!node->content) {
+        return platform::Failure{EISDIR, "read " + path + ": not a regular file"};
+    }
+    if (node->content->size() > limit) {
+        return platform::Failure{EFBIG,
+                                 "read " + path + ": larger than its limit of " + std::to_string(limit) + " bytes"};
+    }
+    return *node->content;
+}
+
+platform::Result<platform::Done> FakeFileSystem::writeFileAtomically(const std::string& path, std::string_view content,
+                                                                     std::uint32_t permissions) {
+    const MutexLock lock(mutex_);
+    if (const int error = checkWritable(path); error != 0) {
+        return failureOf("write", path, error);
+    }
+    nodes_[path] = Node{std::string(content), permissions};
+    return platform::Done();
+}
+
+platform::Result<platform::Done> FakeFileSystem::createDirectories(const std::string& path, std::uint32_t permissions) {
+    const MutexLock lock(mutex_);
+    if (const int error = makeFolders(path, permissions); error != 0) {
+        return failureOf("create folder", path, error);
+    }
+    return platform::Done();
+}
+
+std::string FakeFileSystem::currentDirectory() const {
+    const MutexLock lock(mutex_);
+    return currentDirectory_;
+}
+
+const FakeFileSystem::Node* FakeFileSystem::find(const std::string& path) const {
+    const auto found = nodes_.find(path);
+    return found == nodes_.end() ? nullptr : &found->second;
+}
+
+int FakeFileSystem::errorFor(const std::string& path) const {
+    const auto found = errors_.find(path);
+    return found == errors_.end() ? 0 : found->second;
+}
+
+int FakeFileSystem::makeFolders(const std::string& path, std::uint32_t permissions) {
+    if (path.empty() || path.find('\0') != std::string::npos) {
+        return EINVAL;
+    }
+    if (const int error = errorFor(path); error != 0) {
+        return error;
+    }
+    const std::string whole = tidy(path);
+    for (std::size_t end = whole.find('/', 1);; end = whole.find('/', end + 1)) {
+        const std::string folder = whole.substr(0, end);
+        const Node* const node = find(folder);
+        if (node != nullptr && node->content) {
+            return ENOTDIR;
+        }
+        if (node == nullptr) {
+            nodes_[folder] = Node{std::nullopt, permissions};
+        }
+        if (end == std::string::npos) {
+            return 0;
+        }
+    }
+}
+
+int FakeFileSystem::checkWritable(const std::string& path) const {
+    if (path.empty() || path.ends_with('/') || path.find('\0') != std::string::npos) {
+        return EINVAL;
+    }
+    if (const int error = errorFor(path); error != 0) {
+        return error;
+    }
+    const Node* const folder = find(folderOf(path));
+    if (folder == nullptr) {
+        return ENOENT;
+    }
+    if (folder->content) {
+        return ENOTDIR;
+    }
+    const Node* const old = find(path);
+    return old != nullptr && !old->content ? EISDIR : 0;
+}
+
+} // namespace vela::testing

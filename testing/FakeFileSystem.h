@@ -1,0 +1,61 @@
+// Files and folders in memory, with failures on demand. Paths are absolute and taken as they are, without "." or links.
+// Thread-safe.
+#pragma once
+
+#include "platform/FileSystem.h"
+#include "platform/Mutex.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace vela::testing {
+
+class FakeFileSystem final : public platform::FileSystem {
+public:
+    /// Holds the folder "/", which is also the current one.
+    FakeFileSystem();
+
+    // What a test arranges.
+    /// A file, and the folders above it.
+    void addFile(const std::string& path, std::string content, std::uint32_t permissions = 0644);
+    void setCurrentDirectory(std::string path);
+    /// Every operation on exactly this path fails with `error` (ENOSPC, say); 0 ends it.
+    void failOn(const std::string& path, int error);
+
+    // What a test looks at.
+    std::optional<std::string> contentOf(const std::string& path) const;
+    std::optional<std::uint32_t> permissionsOf(const std::string& path) const;
+    /// Paths of all files, sorted.
+    std::vector<std::string> files() const;
+
+    platform::Result<std::string> readFile(const std::string& path, std::size_t limit) const override;
+    platform::Result<platform::Done> writeFileAtomically(const std::string& path, std::string_view content,
+                                                         std::uint32_t permissions) override;
+    platform::Result<platform::Done> createDirectories(const std::string& path, std::uint32_t permissions) override;
+    std::string currentDirectory() const override;
+
+private:
+    struct Node {
+        std::optional<std::string> content; ///< none for a folder
+        std::uint32_t permissions = 0;
+    };
+
+    const Node* find(const std::string& path) const VELA_REQUIRES(mutex_);
+    /// The error that this path shall meet, or 0.
+    int errorFor(const std::string& path) const VELA_REQUIRES(mutex_);
+    /// 0 or an error number.
+    int makeFolders(const std::string& path, std::uint32_t permissions) VELA_REQUIRES(mutex_);
+    int checkWritable(const std::string& path) const VELA_REQUIRES(mutex_);
+
+    mutable Mutex mutex_;
+    std::map<std::string, Node> nodes_ VELA_GUARDED_BY(mutex_);
+    std::map<std::string, int> errors_ VELA_GUARDED_BY(mutex_);
+    std::string currentDirectory_ VELA_GUARDED_BY(mutex_) = "/";
+};
+
+} // namespace vela::testing
