@@ -1,0 +1,13 @@
+// The two logs of a session. Whatever file a line is written in, it carries the session's name.
+#pragma once
+
+#include "common/VelaReportingLogCategories.h"
+
+namespace vela {
+
+inline NamedLogCategory sessionLog() { return VelaReportingSessionCategory().as("VelaReportingSession"); }
+
+/// Of the real-time reporting path: set-up, queued messages, single messages, end.
+inline NamedLogCategory beaconLog() { return VelaReportingSessionBeaconReportingCategory().as("VelaReportingSession"); }
+
+} // namespace vela

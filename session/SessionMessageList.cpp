@@ -1,0 +1,84 @@
+#include "session/SessionMessageList.h"
+
+#include "common/TextFormat.h"
+#include "common/VelaReportingUtility.h"
+#include "session/SessionLog.h"
+
+namespace vela {
+
+namespace {
+
+// What differs from message to message without saying anything.
+const std::array<Key, 3>& ignoredWhenComparing() {
+    static const std::array<Key, 3> keys = {VelaReportingInternalEventProcessUptimeMs,
+                                            VelaReportingInternalEventSystemUptimeSec,
+                                            VelaReportingInternalEventEpochTime};
+    return keys;
+}
+
+// Only the plain category 11 is an error by category: one with a flag is not.
+bool isError(std::uint32_t category, std::uint32_t type) {
+    return category == AudioEventCategoryError || type == AudioEventTypeError;
+}
+
+} // namespace
+
+void SessionMessageList::begin() {
+    clear();
+    exists_ = true;
+}
+
+void SessionMessageList::clear() {
+    exists_ = false;
+    messages_ = {};
+    kinds_ = {};
+    kindsByIdentifier_ = {};
+    recent_ = {};
+}
+
+bool SessionMessageList::createMessageIdentifierWithCategory(std::uint32_t category, std::uint16_t type,
+                                                             const Dictionary& message) {
+    if (!exists_) {
+        return false;
+    }
+    const std::uint32_t number = kindOf(category, type);
+    Kind& kind = kinds_[number];
+    const bool repeats = kind.count != 0 && equalExcept(messages_[kind.last].message, message, ignoredWhenComparing());
+    if (repeats && !isError(category, type)) {
+        sessionLog().debug("dropping redundant event");
+        return true;
+    }
+    ++kind.count;
+    kind.last = messages_.size();
+    messages_.push_back({number, kind.count, message});
+    return false;
+}
+
+std::string SessionMessageList::keyOf(const StoredMessage& message) const {
+    return formatText("%@_%u", kinds_[message.kind].identifier, message.count);
+}
+
+std::optional<std::uint32_t> SessionMessageList::messageIdentifierCount(std::string_view identifier) const {
+    const auto found = kindsByIdentifier_.find(std::string(identifier));
+    return found == kindsByIdentifier_.end() ? std::nullopt : std::optional(kinds_[found->second].count);
+}
+
+std::uint32_t SessionMessageList::kindOf(std::uint32_t category, std::uint16_t type) {
+    const std::uint64_t numbers = kKnown | (static_cast<std::uint64_t>(category) << 16U) | type;
+    Recent& recent = recent_[(category * 19U + (category >> 24U) + type) % recent_.size()];
+    if (recent.numbers != numbers) {
+        recent = {numbers, kindOfIdentifier(formatText("%@_%@", VelaReportingUtilityCategoryString(category),
+                                                       VelaReportingUtilityTypeString(type)))};
+    }
+    return recent.kind;
+}
+
+std::uint32_t SessionMessageList::kindOfIdentifier(std::string identifier) {
+    const auto [place, isNew] = kindsByIdentifier_.try_emplace(identifier, static_cast<std::uint32_t>(kinds_.size()));
+    if (isNew) {
+        kinds_.push_back({std::move(identifier), 0, 0});
+    }
+    return place->second;
+}
+
+} // namespace vela

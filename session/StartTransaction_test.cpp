@@ -1,0 +1,199 @@
+#include "session/StartTransaction.h"
+
+#include <atomic>
+#include <barrier>
+#include <gtest/gtest.h>
+#include <memory>
+#include <thread>
+#include <vector>
+
+namespace vela {
+
+namespace {
+
+/// Counts the calls of its blocks and checks that each is called with no error and true.
+class Calls {
+public:
+    StartTransaction::Block block() {
+        return [this](std::optional<platform::IpcError> error, bool done) {
+            EXPECT_FALSE(error.has_value());
+            EXPECT_TRUE(done);
+            ++count_;
+        };
+    }
+    int count() const { return count_; }
+
+private:
+    std::atomic<int> count_ = 0;
+};
+
+TEST(StartTransactionTest, ABlockStoredBeforeTheOutcomeIsCalledAtIt) {
+    StartTransaction transaction;
+    Calls calls;
+    const std::uint64_t start = transaction.begin(true);
+    transaction.setBlock(calls.block());
+    EXPECT_EQ(calls.count(), 0);
+    transaction.end(start);
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, ABlockStoredAfterTheOutcomeIsCalledAtOnce) {
+    StartTransaction transaction;
+    Calls calls;
+    transaction.end(transaction.begin(true));
+    transaction.setBlock(calls.block());
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, WithoutASetUpABlockIsCalledAtOnce) {
+    StartTransaction transaction;
+    Calls calls;
+    transaction.begin(false);
+    transaction.setBlock(calls.block());
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, BeforeTheFirstStartABlockIsCalledAtOnce) {
+    StartTransaction transaction;
+    Calls calls;
+    transaction.setBlock(calls.block());
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, ASecondOutcomeCallsNothing) {
+    StartTransaction transaction;
+    Calls calls;
+    const std::uint64_t start = transaction.begin(true);
+    transaction.setBlock(calls.block());
+    transaction.end(start);
+    transaction.end(start);
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, TheOutcomeOfAnEarlierStartDoesNotAnswerALaterOne) {
+    StartTransaction transaction;
+    Calls calls;
+    const std::uint64_t first = transaction.begin(true);
+    const std::uint64_t second = transaction.begin(true);
+    transaction.setBlock(calls.block());
+    transaction.end(first);
+    EXPECT_EQ(calls.count(), 0);
+    transaction.end(second);
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, TheOutcomeOfAnEarlierStartLeavesALaterOneUnended) {
+    StartTransaction transaction;
+    Calls calls;
+    const std::uint64_t first = transaction.begin(true);
+    transaction.begin(true);
+    transaction.end(first);
+    transaction.setBlock(calls.block());
+    EXPECT_EQ(calls.count(), 0);
+}
+
+TEST(StartTransactionTest, ABlockTakesThePlaceOfTheOneThatIsStored) {
+    StartTransaction transaction;
+    Calls old;
+    Calls calls;
+    const std::uint64_t start = transaction.begin(true);
+    transaction.setBlock(old.block());
+    transaction.setBlock(calls.block());
+    transaction.end(start);
+    EXPECT_EQ(old.count(), 0);
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, CallingTheBlockEarlyClearsIt) {
+    StartTransaction transaction;
+    Calls calls;
+    const std::uint64_t start = transaction.begin(true);
+    transaction.setBlock(calls.block());
+    EXPECT_TRUE(transaction.callBlock());
+    EXPECT_FALSE(transaction.callBlock());
+    transaction.end(start);
+    EXPECT_EQ(calls.count(), 1);
+}
+
+TEST(StartTransactionTest, ThereIsNothingToCallWithoutABlock) {
+    StartTransaction transaction;
+    EXPECT_FALSE(transaction.callBlock());
+    transaction.end(transaction.begin(true));
+    EXPECT_FALSE(transaction.callBlock());
+}
+
+TEST(StartTransactionTest, ABlockMayUseTheTransaction) {
+    StartTransaction transaction;
+    Calls inner;
+    const std::uint64_t start = transaction.begin(true);
+    transaction.setBlock([&](std::optional<platform::IpcError>, bool) { transaction.setBlock(inner.block()); });
+    transaction.end(start);
+    EXPECT_EQ(inner.count(), 1);
+}
+
+TEST(StartTransactionTest, ADestroyedTransactionDestroysItsBlockUncalled) {
+    Calls calls;
+    const auto held = std::make_shared<int>(1);
+    {
+        StartTransaction transaction;
+        transaction.begin(true);
+        transaction.setBlock([held, block = calls.block()](std::optional<platform::IpcError> error, bool done) mutable {
+            block(error, done);
+        });
+        EXPECT_EQ(held.use_count(), 2);
+    }
+    EXPECT_EQ(held.use_count(), 1);
+    EXPECT_EQ(calls.count(), 0);
+}
+
+// The outcome of one start and the beginning of the next at the same time, again and again.
+TEST(StartTransactionTest, AnOutcomeNeverAnswersTheStartThatBeginsMeanwhile) {
+    constexpr int kRounds = 5'000;
+    StartTransaction transaction;
+    std::uint64_t first = 0;
+    std::barrier round(2);
+    std::thread outcomes([&] {
+        for (int i = 0; i < kRounds; ++i) {
+            round.arrive_and_wait();
+            transaction.end(first);
+            round.arrive_and_wait();
+        }
+    });
+    int early = 0;
+    int late = 0;
+    for (int i = 0; i < kRounds; ++i) {
+        Calls calls;
+        first = transaction.begin(true);
+        round.arrive_and_wait();
+        const std::uint64_t second = transaction.begin(true);
+        transaction.setBlock(calls.block());
+        round.arrive_and_wait();
+        early += calls.count();
+        transaction.end(second);
+        late += calls.count();
+    }
+    outcomes.join();
+    EXPECT_EQ(early, 0);
+    EXPECT_EQ(late, kRounds);
+}
+
+TEST(StartTransactionTest, OfManyThreadsThatEndOneStartOneCallsTheBlock) {
+    constexpr int kRounds = 200;
+    for (int i = 0; i < kRounds; ++i) {
+        StartTransaction transaction;
+        Calls calls;
+        const std::uint64_t start = transaction.begin(true);
+        std::vector<std::thread> threads;
+        threads.emplace_back([&] { transaction.setBlock(calls.block()); });
+        threads.emplace_back([&] { transaction.end(start); });
+        threads.emplace_back([&] { transaction.callBlock(); });
+        for (std::thread& thread : threads) {
+            thread.join();
+        }
+        ASSERT_EQ(calls.count(), 1);
+    }
+}
+
+} // namespace
+
+} // namespace vela
