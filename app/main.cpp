@@ -54,7 +54,7 @@ int check(const CommandLine& line) {
 } // namespace
 
 int main(int argumentCount, char** arguments) {
-    std::signal(SIGPIPE, SIG_IGN);
+    static_cast<void>(std::signal(SIGPIPE, SIG_IGN)); // it cannot fail for a signal that exists
     const std::vector<std::string_view> given(arguments + (argumentCount > 0 ? 1 : 0), arguments + argumentCount);
     const platform::Result<CommandLine> line = readCommandLine(given);
     if (!line) {

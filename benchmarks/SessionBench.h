@@ -8,6 +8,7 @@
 #include "session/VelaReportingSession.h"
 
 #include <array>
+#include <atomic>
 #include <cstdint>
 #include <cstdio>
 #include <ctime>
@@ -33,7 +34,7 @@ public:
 
     /// Whether a discovery finds back ends at once, or never answers.
     bool answers = true;
-    std::uint64_t sent = 0; ///< written on the session's queue
+    std::atomic<std::uint64_t> sent = 0;
 
 private:
     class Session final : public platform::BeaconSession {

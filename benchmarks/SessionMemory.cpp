@@ -3,12 +3,14 @@
 // Prints one line for each length. An argument is the greatest length; a million otherwise.
 #include "benchmarks/SessionBench.h"
 #include "common/VelaReportingUtility.h"
+#include "testing/TemporaryFolder.h"
 
 #include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
+#include <sys/wait.h>
 #include <unistd.h>
 
 namespace {
@@ -38,15 +40,6 @@ std::uintmax_t bytesBelow(const std::string& folder) {
     return bytes;
 }
 
-/// Returns when all that the session's queue was given has been sent.
-void drain(std::shared_ptr<vela::VelaReportingSession> session) {
-    std::weak_ptr<vela::VelaReportingSession> gone = session;
-    session.reset();
-    while (!gone.expired()) {
-        usleep(1'000);
-    }
-}
-
 void run(std::int64_t length, const std::string& folder) {
     constexpr double kOwnStrings = 2 * 24;
     vela::SessionBench bench(folder);
@@ -56,11 +49,13 @@ void run(std::int64_t length, const std::string& folder) {
         session->sendMessage(vela::benchMessage(number), vela::AudioEventCategoryPlayback, vela::AudioEventTypeState,
                              {});
     }
+    while (bench.beacon.sent < static_cast<std::uint64_t>(length)) {
+        usleep(1'000); // what is still on its way to the back end would count as well
+    }
     const double each = (residentBytes() - before) / static_cast<double>(length);
     const double begin = vela::threadSeconds();
     session->stop();
     const double seconds = vela::threadSeconds() - begin;
-    drain(std::move(session));
     std::printf(
         "%8lld messages: %4.0f bytes each, %4.0f beside its own strings; stop %.3f s, %5.0f ns each; file %ju MB\n",
         static_cast<long long>(length), each, each - kOwnStrings, seconds, seconds * 1e9 / static_cast<double>(length),
@@ -78,14 +73,19 @@ int main(int argc, char** argv) {
     }
     const InternalBuild device;
     const vela::VelaReportingBuildType buildType(device);
+    // Each in a process of its own: memory that an earlier run gave back would be used again and not be seen.
     for (std::int64_t length = std::min<std::int64_t>(longest, 10'000); length <= longest; length *= 10) {
-        std::string folder = (std::filesystem::temp_directory_path() / "vela-session-memory-XXXXXX").string();
-        if (mkdtemp(folder.data()) == nullptr) {
-            std::perror(folder.c_str());
+        const pid_t child = fork();
+        if (child == 0) {
+            const vela::testing::TemporaryFolder folder;
+            run(length, folder.path());
+            return 0;
+        }
+        int status = 0;
+        if (child < 0 || waitpid(child, &status, 0) != child || status != 0) {
+            std::perror("session_memory");
             return 1;
         }
-        run(length, folder);
-        std::filesystem::remove_all(folder);
     }
     return 0;
 }

@@ -7,8 +7,11 @@
 
 namespace vela {
 
-/// What velactl exits with.
-enum ExitStatus : int { kDone = 0, kFailed = 1, kWrongUsage = 2, kNoService = 3 };
+// What velactl exits with.
+constexpr int kDone = 0;
+constexpr int kFailed = 1;
+constexpr int kWrongUsage = 2;
+constexpr int kNoService = 3;
 
 /// Where a subcommand reads and prints.
 struct Console {

@@ -3,6 +3,7 @@
 #include "common/SettingValues.h"
 
 #include <algorithm>
+#include <utility>
 
 namespace vela {
 
@@ -13,213 +14,121 @@ constexpr std::int64_t kMiB = 1024 * kKiB;
 constexpr std::int64_t kGiB = 1024 * kMiB;
 constexpr std::int64_t kTiB = 1024 * kGiB;
 
-std::vector<std::string> texts(std::initializer_list<const char*> list) { return {list.begin(), list.end()}; }
+using S = Settings;
+using Slot = SettingSlot (*)(Settings&);
+using enum SettingKind;
+
+struct Name {
+    std::string_view section;
+    std::string_view key;
+    std::string_view description;
+};
+
+struct Range {
+    std::int64_t least;
+    std::int64_t most;
+};
+
+SettingDescription boolean(const Name& name, bool standard, Slot slot) {
+    return {name.section, name.key, Boolean, standard, 0, 0, {}, name.description, slot};
+}
+
+SettingDescription number(const Name& name, SettingKind kind, std::int64_t standard, Range range, Slot slot) {
+    return {name.section, name.key, kind, standard, range.least, range.most, {}, name.description, slot};
+}
+
+SettingDescription size(const Name& name, const char* standard, Range range, Slot slot) {
+    return {name.section, name.key, ByteSize, standard, range.least, range.most, {}, name.description, slot};
+}
+
+SettingDescription path(const Name& name, const char* standard, Slot slot) {
+    return {name.section, name.key, Path, standard, 0, 0, {}, name.description, slot};
+}
+
+SettingDescription choice(const Name& name, const char* standard, std::vector<std::string_view> choices, Slot slot) {
+    return {name.section, name.key, Choice, standard, 0, 0, std::move(choices), name.description, slot};
+}
+
+/// Without choices any text may be in the list.
+SettingDescription list(const Name& name, std::vector<std::string> standard, std::vector<std::string_view> choices,
+                        Slot slot) {
+    return {name.section, name.key, TextList, std::move(standard), 0, 0, std::move(choices), name.description, slot};
+}
+
+// The table is made in three parts only because of its length.
+
+std::vector<SettingDescription> placeSettings() {
+    return {
+        boolean(Name{"device", "InternalBuild", "Whether this device runs an internal build"}, false,
+                [](S& s) -> SettingSlot { return &s.device.internalBuild; }),
+        boolean(Name{"features", "AudioAnalytics/Tracing",
+                     "A feature flag, \"Domain/Name\"; more may be added, those that are absent are off"},
+                false, [](S& s) -> SettingSlot { return &s.features["AudioAnalytics/Tracing"]; }),
+        path(Name{"paths", "root", "Folder below which the session files and trace results are written"}, "/",
+             [](S& s) -> SettingSlot { return &s.paths.root; }),
+        path(
+            Name{"paths", "state",
+                 "Folder of what outlives a restart; for an ordinary user $XDG_STATE_HOME/vela or ~/.local/state/vela"},
+            "/var/lib/vela", [](S& s) -> SettingSlot { return &s.paths.state; }),
+        path(Name{"paths", "runtime",
+                  "Folder of the socket and the notifications; for an ordinary user $XDG_RUNTIME_DIR/vela"},
+             "/run/vela", [](S& s) -> SettingSlot { return &s.paths.runtime; }),
+        choice(Name{"log", "target", "Where log lines go; standard error when there is no journal"}, "journal",
+               {"journal", "stderr"}, [](S& s) -> SettingSlot { return &s.log.target; }),
+        choice(Name{"log", "level", "The least important level that is logged"}, "default",
+               {"debug", "info", "default", "error"}, [](S& s) -> SettingSlot { return &s.log.level; }),
+    };
+}
+
+std::vector<SettingDescription> deliverySettings() {
+    return {
+        path(Name{"store", "path", "File of the deliveries"}, "<state>/deliveries.db",
+             [](S& s) -> SettingSlot { return &s.store.path; }),
+        size(Name{"store", "max_bytes", "Size of the store above which the oldest deliveries are dropped"}, "256 MiB",
+             {kMiB, kTiB}, [](S& s) -> SettingSlot { return &s.store.maxBytes; }),
+        number(Name{"store", "commit_messages",
+                    "Deliveries that are committed together at the most, and may be lost with the power"},
+               Integer, 64, {1, 65536}, [](S& s) -> SettingSlot { return &s.store.commitMessages; }),
+        number(Name{"store", "commit_ms", "Milliseconds after which a delivery is committed at the latest"},
+               Milliseconds, 250, {1, 60000}, [](S& s) -> SettingSlot { return &s.store.commitDelay; }),
+        list(Name{"beacon", "backends", "Back ends of real-time reporting; without any, discovery finds none"},
+             {"store"}, {"store"}, [](S& s) -> SettingSlot { return &s.beacon.backends; }),
+        list(Name{"tally", "used", "Analytics events that have a consumer: shell patterns over event names"}, {"*"}, {},
+             [](S& s) -> SettingSlot { return &s.tally.used; }),
+        list(Name{"access", "users", "Users who may connect, beside root and the service's own"}, {}, {},
+             [](S& s) -> SettingSlot { return &s.access.users; }),
+        list(Name{"access", "groups", "Groups whose members may connect"}, {"audio"}, {},
+             [](S& s) -> SettingSlot { return &s.access.groups; }),
+    };
+}
+
+/// A message that is larger than the wire protocol's 128 MiB never arrives; a value deeper than 128 cannot be written
+/// as a property list.
+std::vector<SettingDescription> limitSettings() {
+    return {
+        size(Name{"limits", "message_bytes", "Size of one message"}, "1 MiB", {kKiB, 128 * kMiB},
+             [](S& s) -> SettingSlot { return &s.limits.messageBytes; }),
+        number(Name{"limits", "value_depth", "Containers inside each other in one message"}, Integer, 32, {1, 128},
+               [](S& s) -> SettingSlot { return &s.limits.valueDepth; }),
+        number(Name{"limits", "sessions_per_client", "Reporting sessions of one connection"}, Integer, 1024,
+               {1, 1000000}, [](S& s) -> SettingSlot { return &s.limits.sessionsPerClient; }),
+        number(Name{"limits", "clients_per_user", "Connections of one user"}, Integer, 256, {1, 65536},
+               [](S& s) -> SettingSlot { return &s.limits.clientsPerUser; }),
+        size(Name{"limits", "session_bytes", "Size of the messages that one session keeps"}, "64 MiB",
+             {kKiB, 64 * kGiB}, [](S& s) -> SettingSlot { return &s.limits.sessionBytes; }),
+        size(Name{"limits", "total_bytes", "Size of the messages that all sessions keep"}, "512 MiB", {kKiB, kTiB},
+             [](S& s) -> SettingSlot { return &s.limits.totalBytes; }),
+        size(Name{"limits", "unsent_replies", "Size of the replies that wait for a client which does not read them"},
+             "4 MiB", {kKiB, kGiB}, [](S& s) -> SettingSlot { return &s.limits.unsentReplies; }),
+    };
+}
 
 std::vector<SettingDescription> makeTable() {
-    using enum SettingKind;
-    using S = Settings;
-    // A message that is larger than the wire protocol's 128 MiB never arrives; a value deeper than 128 cannot be
-    // written as a property list.
-    return {
-        {"device",
-         "InternalBuild",
-         Boolean,
-         false,
-         0,
-         0,
-         {},
-         "Whether this device runs an internal build",
-         [](S& s) -> SettingSlot { return &s.device.internalBuild; }},
-        {"features",
-         "AudioAnalytics/Tracing",
-         Boolean,
-         false,
-         0,
-         0,
-         {},
-         "A feature flag, \"Domain/Name\"; more may be added, those that are absent are off",
-         [](S& s) -> SettingSlot { return &s.features["AudioAnalytics/Tracing"]; }},
-        {"paths",
-         "root",
-         Path,
-         "/",
-         0,
-         0,
-         {},
-         "Folder below which the session files and trace results are written",
-         [](S& s) -> SettingSlot { return &s.paths.root; }},
-        {"paths",
-         "state",
-         Path,
-         "/var/lib/vela",
-         0,
-         0,
-         {},
-         "Folder of what outlives a restart; for an ordinary user $XDG_STATE_HOME/vela or ~/.local/state/vela",
-         [](S& s) -> SettingSlot { return &s.paths.state; }},
-        {"paths",
-         "runtime",
-         Path,
-         "/run/vela",
-         0,
-         0,
-         {},
-         "Folder of the socket and the notifications; for an ordinary user $XDG_RUNTIME_DIR/vela",
-         [](S& s) -> SettingSlot { return &s.paths.runtime; }},
-        {"log",
-         "target",
-         Choice,
-         "journal",
-         0,
-         0,
-         {"journal", "stderr"},
-         "Where log lines go; standard error when there is no journal",
-         [](S& s) -> SettingSlot { return &s.log.target; }},
-        {"log",
-         "level",
-         Choice,
-         "default",
-         0,
-         0,
-         {"debug", "info", "default", "error"},
-         "The least important level that is logged",
-         [](S& s) -> SettingSlot { return &s.log.level; }},
-        {"store",
-         "path",
-         Path,
-         "<state>/deliveries.db",
-         0,
-         0,
-         {},
-         "File of the deliveries",
-         [](S& s) -> SettingSlot { return &s.store.path; }},
-        {"store",
-         "max_bytes",
-         ByteSize,
-         "256 MiB",
-         kMiB,
-         kTiB,
-         {},
-         "Size of the store above which the oldest deliveries are dropped",
-         [](S& s) -> SettingSlot { return &s.store.maxBytes; }},
-        {"store",
-         "commit_messages",
-         Integer,
-         64,
-         1,
-         65536,
-         {},
-         "Deliveries that are committed together at the most, and may be lost with the power",
-         [](S& s) -> SettingSlot { return &s.store.commitMessages; }},
-        {"store",
-         "commit_ms",
-         Milliseconds,
-         250,
-         1,
-         60000,
-         {},
-         "Milliseconds after which a delivery is committed at the latest",
-         [](S& s) -> SettingSlot { return &s.store.commitDelay; }},
-        {"beacon",
-         "backends",
-         TextList,
-         texts({"store"}),
-         0,
-         0,
-         {"store"},
-         "Back ends of real-time reporting; without any, discovery finds none",
-         [](S& s) -> SettingSlot { return &s.beacon.backends; }},
-        {"tally",
-         "used",
-         TextList,
-         texts({"*"}),
-         0,
-         0,
-         {},
-         "Analytics events that have a consumer: shell patterns over event names",
-         [](S& s) -> SettingSlot { return &s.tally.used; }},
-        {"access",
-         "users",
-         TextList,
-         texts({}),
-         0,
-         0,
-         {},
-         "Users who may connect, beside root and the service's own",
-         [](S& s) -> SettingSlot { return &s.access.users; }},
-        {"access",
-         "groups",
-         TextList,
-         texts({"audio"}),
-         0,
-         0,
-         {},
-         "Groups whose members may connect",
-         [](S& s) -> SettingSlot { return &s.access.groups; }},
-        {"limits",
-         "message_bytes",
-         ByteSize,
-         "1 MiB",
-         kKiB,
-         128 * kMiB,
-         {},
-         "Size of one message",
-         [](S& s) -> SettingSlot { return &s.limits.messageBytes; }},
-        {"limits",
-         "value_depth",
-         Integer,
-         32,
-         1,
-         128,
-         {},
-         "Containers inside each other in one message",
-         [](S& s) -> SettingSlot { return &s.limits.valueDepth; }},
-        {"limits",
-         "sessions_per_client",
-         Integer,
-         1024,
-         1,
-         1000000,
-         {},
-         "Reporting sessions of one connection",
-         [](S& s) -> SettingSlot { return &s.limits.sessionsPerClient; }},
-        {"limits",
-         "clients_per_user",
-         Integer,
-         256,
-         1,
-         65536,
-         {},
-         "Connections of one user",
-         [](S& s) -> SettingSlot { return &s.limits.clientsPerUser; }},
-        {"limits",
-         "session_bytes",
-         ByteSize,
-         "64 MiB",
-         kKiB,
-         64 * kGiB,
-         {},
-         "Size of the messages that one session keeps",
-         [](S& s) -> SettingSlot { return &s.limits.sessionBytes; }},
-        {"limits",
-         "total_bytes",
-         ByteSize,
-         "512 MiB",
-         kKiB,
-         kTiB,
-         {},
-         "Size of the messages that all sessions keep",
-         [](S& s) -> SettingSlot { return &s.limits.totalBytes; }},
-        {"limits",
-         "unsent_replies",
-         ByteSize,
-         "4 MiB",
-         kKiB,
-         kGiB,
-         {},
-         "Size of the replies that wait for a client which does not read them",
-         [](S& s) -> SettingSlot { return &s.limits.unsentReplies; }},
-    };
+    std::vector<SettingDescription> table = placeSettings();
+    for (const auto& more : {deliverySettings(), limitSettings()}) {
+        table.insert(table.end(), more.begin(), more.end());
+    }
+    return table;
 }
 
 std::string numberText(const SettingDescription& description, std::int64_t number) {

@@ -73,7 +73,8 @@ private:
 
     template <class Stored>
     static constexpr bool fitsInPlace() {
-        return sizeof(Stored) <= kInPlaceBytes && alignof(Stored) <= alignof(std::max_align_t) &&
+        constexpr std::size_t kBytes = sizeof(Stored);
+        return kBytes <= kInPlaceBytes && alignof(Stored) <= alignof(std::max_align_t) &&
                std::is_nothrow_move_constructible_v<Stored>;
     }
 

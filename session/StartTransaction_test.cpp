@@ -146,19 +146,26 @@ TEST(StartTransactionTest, ADestroyedTransactionDestroysItsBlockUncalled) {
     EXPECT_EQ(calls.count(), 0);
 }
 
-// The outcome of one start and the beginning of the next at the same time, again and again.
+// Outcomes of one start and the beginning of the next at the same time, again and again; many of the former, so that
+// the lock is fought for and the beginning falls between their steps.
 TEST(StartTransactionTest, AnOutcomeNeverAnswersTheStartThatBeginsMeanwhile) {
-    constexpr int kRounds = 5'000;
+    constexpr int kRounds = 30'000;
+    constexpr int kOutcomes = 4;
     StartTransaction transaction;
     std::uint64_t first = 0;
-    std::barrier round(2);
-    std::thread outcomes([&] {
-        for (int i = 0; i < kRounds; ++i) {
-            round.arrive_and_wait();
-            transaction.end(first);
-            round.arrive_and_wait();
-        }
-    });
+    std::barrier round(kOutcomes + 1);
+    std::vector<std::thread> outcomes;
+    for (int number = 0; number < kOutcomes; ++number) {
+        outcomes.emplace_back([&] {
+            for (int i = 0; i < kRounds; ++i) {
+                round.arrive_and_wait();
+                for (int repeat = 0; repeat < 50; ++repeat) {
+                    transaction.end(first);
+                }
+                round.arrive_and_wait();
+            }
+        });
+    }
     int early = 0;
     int late = 0;
     for (int i = 0; i < kRounds; ++i) {
@@ -172,7 +179,9 @@ TEST(StartTransactionTest, AnOutcomeNeverAnswersTheStartThatBeginsMeanwhile) {
         transaction.end(second);
         late += calls.count();
     }
-    outcomes.join();
+    for (std::thread& thread : outcomes) {
+        thread.join();
+    }
     EXPECT_EQ(early, 0);
     EXPECT_EQ(late, kRounds);
 }

@@ -127,19 +127,22 @@ std::optional<std::string> VelaReportingSession::serialisedMessages() {
         return std::nullopt;
     }
     std::string text;
+    // One entry at a time: writing JSON clears as much room behind a text as the text is long.
+    std::string entry;
     char before = '[';
     for (const StoredMessage& stored : messages) {
-        text += std::exchange(before, ',');
-        text += "\n  {\n    ";
-        appendJsonString(text, nestedAggregatedPayloadData_.keyOf(stored));
-        text += ": ";
+        entry = std::exchange(before, ',');
+        entry += "\n  {\n    ";
+        appendJsonString(entry, nestedAggregatedPayloadData_.keyOf(stored));
+        entry += ": ";
         const platform::Result<platform::Done> done =
-            platform_.jsonWriting.append(text, Value(stored.message), JsonLayout::Pretty, kMessageDepth);
+            platform_.jsonWriting.append(entry, Value(stored.message), JsonLayout::Pretty, kMessageDepth);
         if (!done) {
             sessionLog().error("dataWithJSONObject: %@", done.failure().description);
             return std::string();
         }
-        text += "\n  }";
+        entry += "\n  }";
+        text += entry;
     }
     text += "\n]";
     return text;

@@ -1,9 +1,9 @@
 // What platform/WorkQueue.h promises, as a test suite for every binding. A test program instantiates
-// `WorkQueueContract` with functions that make a `WorkQueueBackend`.
+// `WorkQueueContract` with functions that make a `WorkQueueBackend`. One file of the program includes this.
 #pragma once
 
-#include "platform/Mutex.h"
 #include "platform/WorkQueue.h"
+#include "testing/Record.h"
 
 #include <algorithm>
 #include <atomic>
@@ -42,44 +42,6 @@ public:
 
     /// Lets `duration` pass and what becomes due run.
     virtual void pass(platform::Nanoseconds duration) = 0;
-};
-
-/// Numbers in the order in which items noted them. Thread-safe.
-class Record {
-public:
-    void add(int number) {
-        const MutexLock lock(mutex_);
-        numbers_.push_back(number);
-    }
-
-    std::vector<int> numbers() const {
-        const MutexLock lock(mutex_);
-        return numbers_;
-    }
-
-    std::size_t size() const { return numbers().size(); }
-
-private:
-    mutable Mutex mutex_;
-    std::vector<int> numbers_ VELA_GUARDED_BY(mutex_);
-};
-
-/// A capture whose destruction can be seen.
-class Trace {
-public:
-    explicit Trace(std::function<void()> destroyed) : destroyed_(std::move(destroyed)) {}
-    Trace(Trace&& other) noexcept : destroyed_(std::exchange(other.destroyed_, nullptr)) {}
-    Trace& operator=(Trace&&) = delete;
-    Trace(const Trace&) = delete;
-    Trace& operator=(const Trace&) = delete;
-    ~Trace() {
-        if (destroyed_ != nullptr) {
-            destroyed_();
-        }
-    }
-
-private:
-    std::function<void()> destroyed_;
 };
 
 using MakeWorkQueueBackend = std::function<std::unique_ptr<WorkQueueBackend>()>;

@@ -199,7 +199,9 @@ void addDate(Sink& json, Date date) {
 class Writer {
 public:
     Writer(std::string& json, JsonLayout layout, std::size_t depth)
-        : json_(json), pretty_(layout == JsonLayout::Pretty), depth_(depth) {}
+        : json_(json),
+          pretty_(layout == JsonLayout::Pretty),
+          depth_(depth) {}
 
     void add(ValueRef value) {
         switch (value.kind()) {

@@ -15,6 +15,7 @@ char* writeShortDecimal(char* at, double number) {
     if (!(scaled < 1e15)) {
         return nullptr;
     }
+    // NOLINTNEXTLINE(bugprone-incorrect-roundings): a wrong one does not read back
     auto digits = static_cast<std::uint64_t>(scaled + 0.5);
     if (static_cast<double>(digits) / kScale != std::abs(number) || (digits < 10 && digits != 0)) {
         return nullptr; // below 0.00001 an exponent is shorter

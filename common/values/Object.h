@@ -59,8 +59,8 @@ inline BytesObject* makeBytes(std::string_view text) {
     const std::size_t padded = (text.size() + 7) / 8 * 8;
     auto* object = ::new (::operator new(sizeof(BytesObject) + padded)) BytesObject;
     object->size = static_cast<std::uint32_t>(text.size());
-    constexpr std::uint64_t none = 0;
-    std::memcpy(object->bytes() + padded - sizeof(none), &none, sizeof(none));
+    constexpr std::uint64_t kNone = 0;
+    std::memcpy(object->bytes() + padded - sizeof(kNone), &kNone, sizeof(kNone));
     std::memcpy(object->bytes(), text.data(), text.size());
     return object;
 }
@@ -152,8 +152,8 @@ inline std::uint64_t eightKinds(const ValueKind* kinds, std::uint32_t slot) {
 
 /// Zeros the padding behind the kinds of `size` values (not none).
 inline void clearPadding(ValueKind* kinds, std::uint32_t size) {
-    constexpr std::uint64_t none = 0;
-    std::memcpy(kinds + (size - 1) / 8 * 8, &none, sizeof(none));
+    constexpr std::uint64_t kNone = 0;
+    std::memcpy(kinds + (size - 1) / 8 * 8, &kNone, sizeof(kNone));
 }
 
 /// Calls `use(slot)` for every one of `size` kinds that is a reference.

@@ -191,14 +191,14 @@ bool ValueRef::booleanValue(bool otherwise) const {
 }
 
 std::int64_t ValueRef::integerValue(std::int64_t otherwise) const {
-    constexpr auto smallest = std::numeric_limits<std::int64_t>::min();
-    constexpr auto largest = std::numeric_limits<std::int64_t>::max();
+    constexpr auto kSmallest = std::numeric_limits<std::int64_t>::min();
+    constexpr auto kLargest = std::numeric_limits<std::int64_t>::max();
     switch (kind_) {
     case ValueKind::Boolean:
     case ValueKind::Integer:
         return static_cast<std::int64_t>(payload_);
     case ValueKind::Unsigned:
-        return largest;
+        return kLargest;
     case ValueKind::Real:
     case ValueKind::Real32: {
         const double number = real();
@@ -206,9 +206,9 @@ std::int64_t ValueRef::integerValue(std::int64_t otherwise) const {
             return 0;
         }
         if (number >= 0x1p63) {
-            return largest;
+            return kLargest;
         }
-        return number < -0x1p63 ? smallest : static_cast<std::int64_t>(number);
+        return number < -0x1p63 ? kSmallest : static_cast<std::int64_t>(number);
     }
     default:
         return otherwise;

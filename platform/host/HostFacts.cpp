@@ -12,11 +12,6 @@ namespace vela::platform {
 
 namespace {
 
-std::string environmentText(const char* name) {
-    const char* text = std::getenv(name);
-    return text == nullptr ? "" : text;
-}
-
 std::string parentOf(const std::string& path) {
     const std::size_t slash = path.find_last_of('/');
     return slash == 0 || slash == std::string::npos ? "/" : path.substr(0, slash);
@@ -34,6 +29,11 @@ bool isFolder(const struct stat& status) { return S_ISDIR(status.st_mode); }
 bool mayUse(const std::string& path, int mode) { return faccessat(AT_FDCWD, path.c_str(), mode, AT_EACCESS) == 0; }
 
 } // namespace
+
+std::string environmentText(const char* name) {
+    const char* text = std::getenv(name); // NOLINT(concurrency-mt-unsafe): nothing here changes the environment
+    return text == nullptr ? "" : text;
+}
 
 SettingsEnvironment processEnvironment() {
     return {geteuid() != 0, environmentText("XDG_RUNTIME_DIR"), environmentText("XDG_STATE_HOME"),

@@ -10,6 +10,9 @@
 
 namespace vela::platform {
 
+/// The environment variable `name`; empty where it is not set.
+std::string environmentText(const char* name);
+
 /// Who runs this process, and the folders that its environment names.
 SettingsEnvironment processEnvironment();
 

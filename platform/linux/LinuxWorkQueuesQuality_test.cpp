@@ -1,6 +1,6 @@
 #include "platform/linux/LinuxWorkQueues.h"
 #include "platform/linux/WorkQueueTestTools.h"
-#include "testing/WorkQueueContract.h"
+#include "testing/Record.h"
 
 #include <atomic>
 #include <chrono>
