@@ -1,5 +1,5 @@
-// The dictionary against nlohmann::ordered_json and std::map of std::variant, with one message of 12 entries: 3 booleans,
-// 4 integers, 3 reals, 2 strings of 24 characters. Every figure stands beside its peers' in one run.
+// The dictionary against nlohmann::ordered_json and std::map of std::variant, with one message of 12 entries: 3
+// booleans, 4 integers, 3 reals, 2 strings of 24 characters. Every figure stands beside its peers' in one run.
 #include "common/values/Dictionary.h"
 #include "common/values/Json.h"
 
@@ -18,9 +18,17 @@ using vela::Key;
 using Json = nlohmann::ordered_json;
 using Map = std::map<std::string, std::variant<bool, std::int64_t, double, std::string>>;
 
-constexpr const char* kKeys[12] = {"session_output_running", "spatializationEnabled", "ringerstate", "msgidx",
-                                   "msgcnt",                 "mChannelsPerFrame",     "sample_rate", "NexoSessionVolume",
-                                   "session_duration",       "systemuptime_sec",      "active_devices",
+constexpr const char* kKeys[12] = {"session_output_running",
+                                   "spatializationEnabled",
+                                   "ringerstate",
+                                   "msgidx",
+                                   "msgcnt",
+                                   "mChannelsPerFrame",
+                                   "sample_rate",
+                                   "NexoSessionVolume",
+                                   "session_duration",
+                                   "systemuptime_sec",
+                                   "active_devices",
                                    "session_selected_format"};
 constexpr const char* kDevices = "Speaker,BuiltInReceiver1";
 constexpr const char* kFormat = "48000 Hz, 2 ch, F32 LE..";

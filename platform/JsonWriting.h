@@ -15,8 +15,8 @@ class JsonWriting {
 public:
     virtual ~JsonWriting() = default;
 
-    /// Appends the UTF-8 JSON text of `value`: data as base64, dates as ISO 8601 UTC, what is no number or infinite as null.
-    /// `depth`: how many containers it stands in. After a failure the text ends anywhere.
+    /// Appends the UTF-8 JSON text of `value`: data as base64, dates as ISO 8601 UTC, what is no number or infinite as
+    /// null. `depth`: how many containers it stands in. After a failure the text ends anywhere.
     virtual Result<Done> append(std::string& text, ValueRef value, JsonLayout layout, std::size_t depth) const = 0;
 
     Result<std::string> write(ValueRef value, JsonLayout layout) const {
