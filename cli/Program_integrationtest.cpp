@@ -99,8 +99,7 @@ TEST_F(VelactlProgramTest, APropertyListIsPrintedInAnotherForm) {
 }
 
 TEST_F(VelactlProgramTest, OutputThatCannotBeWrittenIsAFailure) {
-    const testing::ProgramRun full =
-        testing::runProgram({"/bin/sh", "-c", std::string(VELACTL) + " --help >/dev/full"}, {});
+    const testing::ProgramRun full = testing::runProgram({"/bin/sh", "-c", R"("$0" --help >/dev/full)", VELACTL}, {});
     EXPECT_EQ(full.status, 1);
 }
 

@@ -5,6 +5,7 @@
 #include "session/SessionLog.h"
 #include "session/VelaReportingSession.h"
 
+#include <algorithm>
 #include <string>
 #include <unordered_map>
 #include <utility>
@@ -74,6 +75,16 @@ private:
     std::vector<std::size_t> columnsOfPrevious_;
 };
 
+// When `next` is the message numbered 1,000: makes room for all of them at the length of those so far, so that the text
+// of a long session is not copied while it grows.
+void reserveForAll(std::string& text, std::span<const StoredMessage> messages, const StoredMessage& next) {
+    constexpr std::size_t kSample = 1000;
+    constexpr std::size_t kMostRoom = std::size_t{512} * 1024 * 1024; // a wrong guess must not ask for all there is
+    if (messages.size() > kSample && &next == &messages[kSample]) {
+        text.reserve(std::min(kMostRoom, text.size() / kSample * (messages.size() + messages.size() / 16)));
+    }
+}
+
 } // namespace
 
 std::optional<Dictionary> VelaReportingSession::createSummaryEventForSession() {
@@ -127,22 +138,20 @@ std::optional<std::string> VelaReportingSession::serialisedMessages() {
         return std::nullopt;
     }
     std::string text;
-    // One entry at a time: writing JSON clears as much room behind a text as the text is long.
-    std::string entry;
     char before = '[';
     for (const StoredMessage& stored : messages) {
-        entry = std::exchange(before, ',');
-        entry += "\n  {\n    ";
-        appendJsonString(entry, nestedAggregatedPayloadData_.keyOf(stored));
-        entry += ": ";
+        reserveForAll(text, messages, stored);
+        text += std::exchange(before, ',');
+        text += "\n  {\n    ";
+        appendJsonString(text, nestedAggregatedPayloadData_.keyOf(stored));
+        text += ": ";
         const platform::Result<platform::Done> done =
-            platform_.jsonWriting.append(entry, Value(stored.message), JsonLayout::Pretty, kMessageDepth);
+            platform_.jsonWriting.append(text, Value(stored.message), JsonLayout::Pretty, kMessageDepth);
         if (!done) {
             sessionLog().error("dataWithJSONObject: %@", done.failure().description);
             return std::string();
         }
-        entry += "\n  }";
-        text += entry;
+        text += "\n  }";
     }
     text += "\n]";
     return text;

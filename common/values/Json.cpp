@@ -45,7 +45,7 @@ bool eightArePlain(std::uint64_t eight) {
 // The growing text: room is made before a piece is written, so that each byte is written without a test of its own.
 class Sink {
 public:
-    explicit Sink(std::string& text) : text_(text), used_(text.size()) {}
+    explicit Sink(std::string& text) : text_(text), start_(text.size()), used_(text.size()) {}
     Sink(const Sink&) = delete;
     Sink& operator=(const Sink&) = delete;
     ~Sink() { text_.resize(used_); }
@@ -82,11 +82,13 @@ public:
 
 private:
     void grow(std::size_t bytes) {
+        // In proportion to what was written here, not to a long text that it is appended to.
         constexpr std::size_t kFirst = 480;
-        text_.resize(std::max({kFirst, text_.size() * 2, used_ + bytes}));
+        text_.resize(used_ + std::max({kFirst, used_ - start_, bytes}));
     }
 
     std::string& text_;
+    const std::size_t start_;
     std::size_t used_;
 };
 

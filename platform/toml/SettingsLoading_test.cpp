@@ -64,7 +64,7 @@ TEST_F(SettingsLoadingTest, ANamedFileStandsInPlaceOfTheStandardOne) {
 
 TEST_F(SettingsLoadingTest, ARelativeNameIsBelowTheCurrentFolderAndShownAsGiven) {
     files_.addFile("/srv/mine.toml", "[log]\nlevel = 5\n");
-    files_.setCurrentDirectory("/work");
+    files_.setCurrentDirectory("/srv");
     EXPECT_THAT(faultsOf("mine.toml"), ElementsAre("mine.toml:2: log.level: 5 is none of debug, info, default, error"));
 }
 
