@@ -82,9 +82,11 @@ struct SessionBench {
         session->setBeaconReportingEnabled(true);
         session->start();
         if (beacon.answers) {
-            std::binary_semaphore ready(0);
-            session->setTransactionCompleteBlock([&](std::optional<platform::IpcError>, bool) { ready.release(); });
-            ready.acquire();
+            // Shared: this thread may go on while the other is still leaving `release`.
+            const auto ready = std::make_shared<std::binary_semaphore>(0);
+            session->setTransactionCompleteBlock(
+                [ready](const std::optional<platform::IpcError>&, bool) { ready->release(); });
+            ready->acquire();
         }
         return session;
     }

@@ -15,7 +15,7 @@ namespace {
 class Calls {
 public:
     StartTransaction::Block block() {
-        return [this](std::optional<platform::IpcError> error, bool done) {
+        return [this](const std::optional<platform::IpcError>& error, bool done) {
             EXPECT_FALSE(error.has_value());
             EXPECT_TRUE(done);
             ++count_;
@@ -126,7 +126,7 @@ TEST(StartTransactionTest, ABlockMayUseTheTransaction) {
     StartTransaction transaction;
     Calls inner;
     const std::uint64_t start = transaction.begin(true);
-    transaction.setBlock([&](std::optional<platform::IpcError>, bool) { transaction.setBlock(inner.block()); });
+    transaction.setBlock([&](const std::optional<platform::IpcError>&, bool) { transaction.setBlock(inner.block()); });
     transaction.end(start);
     EXPECT_EQ(inner.count(), 1);
 }
@@ -137,9 +137,8 @@ TEST(StartTransactionTest, ADestroyedTransactionDestroysItsBlockUncalled) {
     {
         StartTransaction transaction;
         transaction.begin(true);
-        transaction.setBlock([held, block = calls.block()](std::optional<platform::IpcError> error, bool done) mutable {
-            block(error, done);
-        });
+        transaction.setBlock([held, block = calls.block()](const std::optional<platform::IpcError>& error,
+                                                           bool done) mutable { block(error, done); });
         EXPECT_EQ(held.use_count(), 2);
     }
     EXPECT_EQ(held.use_count(), 1);
@@ -155,6 +154,7 @@ TEST(StartTransactionTest, AnOutcomeNeverAnswersTheStartThatBeginsMeanwhile) {
     std::uint64_t first = 0;
     std::barrier round(kOutcomes + 1);
     std::vector<std::thread> outcomes;
+    outcomes.reserve(kOutcomes);
     for (int number = 0; number < kOutcomes; ++number) {
         outcomes.emplace_back([&] {
             for (int i = 0; i < kRounds; ++i) {
