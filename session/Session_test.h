@@ -55,7 +55,7 @@ inline std::vector<std::string> keysOf(const Dictionary& dictionary) {
 }
 
 /// A message's key in the list and the message itself, in textual form: "Generic_Start_1 {a = 1;}".
-inline std::vector<std::string> recordedBy(SessionMessageList& list) {
+inline std::vector<std::string> recordedBy(VelaReportingSessionMessageList& list) {
     const MutexLock lock(list.mutex());
     std::vector<std::string> messages;
     for (const StoredMessage& stored : list.messages()) {
@@ -63,7 +63,7 @@ inline std::vector<std::string> recordedBy(SessionMessageList& list) {
     }
     return messages;
 }
-inline std::vector<std::string> recordedKeysOf(SessionMessageList& list) {
+inline std::vector<std::string> recordedKeysOf(VelaReportingSessionMessageList& list) {
     const MutexLock lock(list.mutex());
     std::vector<std::string> keys;
     for (const StoredMessage& stored : list.messages()) {
@@ -72,12 +72,12 @@ inline std::vector<std::string> recordedKeysOf(SessionMessageList& list) {
     return keys;
 }
 inline bool listExists(VelaReportingSession& session) {
-    SessionMessageList& list = session.nestedAggregatedPayloadData();
+    VelaReportingSessionMessageList& list = session.nestedAggregatedPayloadData();
     const MutexLock lock(list.mutex());
     return list.exists();
 }
 inline std::optional<std::uint32_t> countOf(VelaReportingSession& session, const std::string& identifier) {
-    SessionMessageList& list = session.nestedAggregatedPayloadData();
+    VelaReportingSessionMessageList& list = session.nestedAggregatedPayloadData();
     const MutexLock lock(list.mutex());
     return list.messageIdentifierCount(identifier);
 }

@@ -22,8 +22,8 @@
 #include "platform/Mutex.h"
 #include "platform/Spoor.h"
 #include "platform/WorkQueue.h"
-#include "session/SessionMessageList.h"
-#include "session/StartTransaction.h"
+#include "session/VelaReportingSessionMessageList.h"
+#include "session/VelaReportingStartTransaction.h"
 
 #include <atomic>
 #include <cstdint>
@@ -129,12 +129,14 @@ public:
     void updateConfigurationWithContentsOfConfiguration(const Dictionary& configuration);
 
     /// Reply of the start that is under way. Stored when its real-time set-up still goes on, else called at once.
-    void setTransactionCompleteBlock(StartTransaction::Block block) { transaction_.setBlock(std::move(block)); }
+    void setTransactionCompleteBlock(VelaReportingStartTransaction::Block block) {
+        transaction_.setBlock(std::move(block));
+    }
     /// Calls and clears what is stored. Whether there was one.
     bool completeTransaction() { return transaction_.callBlock(); }
 
     /// The messages and counters of the running session; absent when it does not run.
-    SessionMessageList& nestedAggregatedPayloadData() { return nestedAggregatedPayloadData_; }
+    VelaReportingSessionMessageList& nestedAggregatedPayloadData() { return nestedAggregatedPayloadData_; }
 
     /// Whether real-time reporting found back ends: the flag itself, for callers that poll it. Lives as long as the
     /// session.
@@ -191,8 +193,8 @@ private:
     std::atomic<bool> beaconReportingEnabled_ = false;
     std::atomic<bool> beaconReportingSessionStarted_ = false;
     std::atomic<std::uint16_t> serviceType_ = AudioServiceTypeUnknown;
-    SessionMessageList nestedAggregatedPayloadData_;
-    StartTransaction transaction_;
+    VelaReportingSessionMessageList nestedAggregatedPayloadData_;
+    VelaReportingStartTransaction transaction_;
     mutable Mutex configurationMutex_;
     Dictionary configuration_ VELA_GUARDED_BY(configurationMutex_);
     std::once_flag beaconReportingQueueMade_;

@@ -20,7 +20,7 @@ constexpr std::uint32_t kFilePermissions = 0644;
 
 // Joins the values of each key, in one walk over the messages. Messages with the keys of the one before need no
 // look-up.
-class SummaryGatherer {
+class VelaReportingSummaryGatherer {
 public:
     void addFirst(const Key& key, const Value& value) { append(columnOf(key), value); }
 
@@ -95,7 +95,7 @@ std::optional<Dictionary> VelaReportingSession::createSummaryEventForSession() {
     if (messages.empty()) {
         return std::nullopt;
     }
-    SummaryGatherer gatherer;
+    VelaReportingSummaryGatherer gatherer;
     gatherer.addFirst(summaryEvent, serviceType());
     for (const StoredMessage& stored : messages) {
         gatherer.add(stored.message);

@@ -51,7 +51,14 @@ public:
 
     std::string_view text() const { return object_->view(); }
     friend bool operator==(const Key& left, const Key& right) { return left.object_ == right.object_; }
-    friend bool operator==(const Key& left, std::string_view right) { return left.text() == right; }
+    friend bool operator==(const Key& left, std::string_view right) {
+        const std::string_view text = left.text();
+        if (text.size() != right.size()) {
+            return false;
+        }
+        // The usual lengths without a call; a shorter text may not be read a word at a time.
+        return text.size() > 8 ? detail::sameBytes(text.data(), right.data(), left.object_->size) : text == right;
+    }
 
     const detail::KeyObject* object() const { return object_; }
 

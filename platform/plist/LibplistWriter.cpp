@@ -178,6 +178,16 @@ bool TreeMaker::isWritable(std::string_view text) {
     return false;
 }
 
+/// No reader needs the line, which names a document on somebody's server.
+std::string withoutDocumentType(std::string xml) {
+    const std::size_t begin = xml.find("<!DOCTYPE");
+    const std::size_t end = begin == std::string::npos ? begin : xml.find('\n', begin);
+    if (end != std::string::npos) {
+        xml.erase(begin, end + 1 - begin);
+    }
+    return xml;
+}
+
 /// Only text can hold a CR, libplist ends its lines with LF; read back as it stands it would be a LF.
 std::string withCarriageReturnsAsReferences(std::string_view xml) {
     std::string text;
@@ -212,8 +222,12 @@ Result<std::string> write(ValueRef value, PropertyListFormat format, Writer writ
 } // namespace
 
 Result<std::string> writeXml(ValueRef value) {
-    const auto xml = write(value, PropertyListFormat::Xml, &plist_to_xml);
-    return xml && xml->find('\r') != std::string::npos ? Result(withCarriageReturnsAsReferences(*xml)) : xml;
+    auto xml = write(value, PropertyListFormat::Xml, &plist_to_xml);
+    if (!xml) {
+        return xml;
+    }
+    std::string text = withoutDocumentType(*std::move(xml));
+    return text.find('\r') != std::string::npos ? withCarriageReturnsAsReferences(text) : text;
 }
 
 Result<std::string> writeBinary(ValueRef value) { return write(value, PropertyListFormat::Binary, &plist_to_bin); }

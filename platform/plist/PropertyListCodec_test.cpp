@@ -310,6 +310,12 @@ TEST(PropertyListCodecTest, InvalidUtf8IsRefusedInXmlAndBinary) {
     EXPECT_EQ(rewritten(Array{"a\xFF"}, PropertyListFormat::Text), Value(Array{"a\xEF\xBF\xBD"}));
 }
 
+TEST(PropertyListCodecTest, XmlNamesNoDocumentType) {
+    EXPECT_EQ(*PropertyListCodec().write(Value(Dictionary{{"a", "x"}}), PropertyListFormat::Xml),
+              "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
+              "<plist version=\"1.0\">\n<dict>\n\t<key>a</key>\n\t<string>x</string>\n</dict>\n</plist>\n");
+}
+
 TEST(PropertyListCodecTest, NoValueIsNotWritten) {
     for (const PropertyListFormat format : kFormats) {
         EXPECT_EQ(writingError(Value(), format), "property list: there is no value");

@@ -16,7 +16,7 @@
 
 namespace vela {
 
-class StartTransaction {
+class VelaReportingStartTransaction {
 public:
     using Block = platform::IpcReply<bool>;
 

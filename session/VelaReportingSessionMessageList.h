@@ -19,7 +19,7 @@
 
 namespace vela {
 
-class SessionMessageList {
+class VelaReportingSessionMessageList {
 public:
     Mutex& mutex() VELA_RETURN_CAPABILITY(mutex_) { return mutex_; }
 

@@ -1,4 +1,4 @@
-#include "session/StartTransaction.h"
+#include "session/VelaReportingStartTransaction.h"
 
 #include <atomic>
 #include <barrier>
@@ -14,7 +14,7 @@ namespace {
 /// Counts the calls of its blocks and checks that each is called with no error and true.
 class Calls {
 public:
-    StartTransaction::Block block() {
+    VelaReportingStartTransaction::Block block() {
         return [this](const std::optional<platform::IpcError>& error, bool done) {
             EXPECT_FALSE(error.has_value());
             EXPECT_TRUE(done);
@@ -27,8 +27,8 @@ private:
     std::atomic<int> count_ = 0;
 };
 
-TEST(StartTransactionTest, ABlockStoredBeforeTheOutcomeIsCalledAtIt) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, ABlockStoredBeforeTheOutcomeIsCalledAtIt) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     const std::uint64_t start = transaction.begin(true);
     transaction.setBlock(calls.block());
@@ -37,31 +37,31 @@ TEST(StartTransactionTest, ABlockStoredBeforeTheOutcomeIsCalledAtIt) {
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, ABlockStoredAfterTheOutcomeIsCalledAtOnce) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, ABlockStoredAfterTheOutcomeIsCalledAtOnce) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     transaction.end(transaction.begin(true));
     transaction.setBlock(calls.block());
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, WithoutASetUpABlockIsCalledAtOnce) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, WithoutASetUpABlockIsCalledAtOnce) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     transaction.begin(false);
     transaction.setBlock(calls.block());
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, BeforeTheFirstStartABlockIsCalledAtOnce) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, BeforeTheFirstStartABlockIsCalledAtOnce) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     transaction.setBlock(calls.block());
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, ASecondOutcomeCallsNothing) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, ASecondOutcomeCallsNothing) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     const std::uint64_t start = transaction.begin(true);
     transaction.setBlock(calls.block());
@@ -70,8 +70,8 @@ TEST(StartTransactionTest, ASecondOutcomeCallsNothing) {
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, TheOutcomeOfAnEarlierStartDoesNotAnswerALaterOne) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, TheOutcomeOfAnEarlierStartDoesNotAnswerALaterOne) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     const std::uint64_t first = transaction.begin(true);
     const std::uint64_t second = transaction.begin(true);
@@ -82,8 +82,8 @@ TEST(StartTransactionTest, TheOutcomeOfAnEarlierStartDoesNotAnswerALaterOne) {
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, TheOutcomeOfAnEarlierStartLeavesALaterOneUnended) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, TheOutcomeOfAnEarlierStartLeavesALaterOneUnended) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     const std::uint64_t first = transaction.begin(true);
     transaction.begin(true);
@@ -92,8 +92,8 @@ TEST(StartTransactionTest, TheOutcomeOfAnEarlierStartLeavesALaterOneUnended) {
     EXPECT_EQ(calls.count(), 0);
 }
 
-TEST(StartTransactionTest, ABlockTakesThePlaceOfTheOneThatIsStored) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, ABlockTakesThePlaceOfTheOneThatIsStored) {
+    VelaReportingStartTransaction transaction;
     Calls old;
     Calls calls;
     const std::uint64_t start = transaction.begin(true);
@@ -104,8 +104,8 @@ TEST(StartTransactionTest, ABlockTakesThePlaceOfTheOneThatIsStored) {
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, CallingTheBlockEarlyClearsIt) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, CallingTheBlockEarlyClearsIt) {
+    VelaReportingStartTransaction transaction;
     Calls calls;
     const std::uint64_t start = transaction.begin(true);
     transaction.setBlock(calls.block());
@@ -115,15 +115,15 @@ TEST(StartTransactionTest, CallingTheBlockEarlyClearsIt) {
     EXPECT_EQ(calls.count(), 1);
 }
 
-TEST(StartTransactionTest, ThereIsNothingToCallWithoutABlock) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, ThereIsNothingToCallWithoutABlock) {
+    VelaReportingStartTransaction transaction;
     EXPECT_FALSE(transaction.callBlock());
     transaction.end(transaction.begin(true));
     EXPECT_FALSE(transaction.callBlock());
 }
 
-TEST(StartTransactionTest, ABlockMayUseTheTransaction) {
-    StartTransaction transaction;
+TEST(VelaReportingStartTransactionTest, ABlockMayUseTheTransaction) {
+    VelaReportingStartTransaction transaction;
     Calls inner;
     const std::uint64_t start = transaction.begin(true);
     transaction.setBlock([&](const std::optional<platform::IpcError>&, bool) { transaction.setBlock(inner.block()); });
@@ -131,11 +131,11 @@ TEST(StartTransactionTest, ABlockMayUseTheTransaction) {
     EXPECT_EQ(inner.count(), 1);
 }
 
-TEST(StartTransactionTest, ADestroyedTransactionDestroysItsBlockUncalled) {
+TEST(VelaReportingStartTransactionTest, ADestroyedTransactionDestroysItsBlockUncalled) {
     Calls calls;
     const auto held = std::make_shared<int>(1);
     {
-        StartTransaction transaction;
+        VelaReportingStartTransaction transaction;
         transaction.begin(true);
         transaction.setBlock([held, block = calls.block()](const std::optional<platform::IpcError>& error,
                                                            bool done) mutable { block(error, done); });
@@ -147,10 +147,10 @@ TEST(StartTransactionTest, ADestroyedTransactionDestroysItsBlockUncalled) {
 
 // Outcomes of one start and the beginning of the next at the same time, again and again; many of the former, so that
 // the lock is fought for and the beginning falls between their steps.
-TEST(StartTransactionTest, AnOutcomeNeverAnswersTheStartThatBeginsMeanwhile) {
+TEST(VelaReportingStartTransactionTest, AnOutcomeNeverAnswersTheStartThatBeginsMeanwhile) {
     constexpr int kRounds = 30'000;
     constexpr int kOutcomes = 4;
-    StartTransaction transaction;
+    VelaReportingStartTransaction transaction;
     std::uint64_t first = 0;
     std::barrier round(kOutcomes + 1);
     std::vector<std::thread> outcomes;
@@ -186,10 +186,10 @@ TEST(StartTransactionTest, AnOutcomeNeverAnswersTheStartThatBeginsMeanwhile) {
     EXPECT_EQ(late, kRounds);
 }
 
-TEST(StartTransactionTest, OfManyThreadsThatEndOneStartOneCallsTheBlock) {
+TEST(VelaReportingStartTransactionTest, OfManyThreadsThatEndOneStartOneCallsTheBlock) {
     constexpr int kRounds = 200;
     for (int i = 0; i < kRounds; ++i) {
-        StartTransaction transaction;
+        VelaReportingStartTransaction transaction;
         Calls calls;
         const std::uint64_t start = transaction.begin(true);
         std::vector<std::thread> threads;

@@ -1,5 +1,5 @@
-#include "session/SessionMessageList.h"
 #include "session/Session_test.h"
+#include "session/VelaReportingSessionMessageList.h"
 
 #include <map>
 #include <random>
@@ -11,9 +11,9 @@ namespace {
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
-class SessionMessageListTest : public ::testing::Test {
+class VelaReportingSessionMessageListTest : public ::testing::Test {
 protected:
-    SessionMessageListTest() {
+    VelaReportingSessionMessageListTest() {
         const MutexLock lock(list_.mutex());
         list_.begin();
     }
@@ -30,10 +30,10 @@ protected:
     std::vector<std::string> keys() { return recordedKeysOf(list_); }
 
     testing::CapturingLog log_;
-    SessionMessageList list_;
+    VelaReportingSessionMessageList list_;
 };
 
-TEST_F(SessionMessageListTest, TheFirstOfAnIdentifierHasTheCountOne) {
+TEST_F(VelaReportingSessionMessageListTest, TheFirstOfAnIdentifierHasTheCountOne) {
     EXPECT_FALSE(identify(1, 1, {{"a", 1}}));
     EXPECT_THAT(recorded(), ElementsAre("Generic_Start_1 {a = 1;}"));
     EXPECT_EQ(count("Generic_Start"), 1U);
@@ -41,13 +41,13 @@ TEST_F(SessionMessageListTest, TheFirstOfAnIdentifierHasTheCountOne) {
     EXPECT_THAT(log_.lines(), IsEmpty());
 }
 
-TEST_F(SessionMessageListTest, FlagsStandInTheIdentifier) {
+TEST_F(VelaReportingSessionMessageListTest, FlagsStandInTheIdentifier) {
     identify(0x10000004, 1, {{"a", 1}});
     identify(0xFFFFFFFF, 65535, {{"a", 1}});
     EXPECT_THAT(keys(), ElementsAre("DSP_Playback_Start_1", "Undefined_Unknown_1"));
 }
 
-TEST_F(SessionMessageListTest, DifferentMessagesCountOn) {
+TEST_F(VelaReportingSessionMessageListTest, DifferentMessagesCountOn) {
     EXPECT_FALSE(identify(1, 1, {{"a", 1}, {"velareporting_timestamp", 1.5}}));
     EXPECT_FALSE(identify(1, 1, {{"a", 2}, {"velareporting_timestamp", 2.5}}));
     EXPECT_THAT(recorded(), ElementsAre("Generic_Start_1 {a = 1; velareporting_timestamp = 1.5;}",
@@ -55,7 +55,7 @@ TEST_F(SessionMessageListTest, DifferentMessagesCountOn) {
     EXPECT_EQ(count("Generic_Start"), 2U);
 }
 
-TEST_F(SessionMessageListTest, ARepeatIsRedundant) {
+TEST_F(VelaReportingSessionMessageListTest, ARepeatIsRedundant) {
     identify(1, 1, {{"a", 1}});
     EXPECT_TRUE(identify(1, 1, {{"a", 1}}));
     EXPECT_THAT(keys(), ElementsAre("Generic_Start_1"));
@@ -63,8 +63,8 @@ TEST_F(SessionMessageListTest, ARepeatIsRedundant) {
     EXPECT_THAT(log_.lines(), ElementsAre(sessionLine(LogLevel::Debug, "dropping redundant event")));
 }
 
-class IgnoredKeyTest : public SessionMessageListTest, public ::testing::WithParamInterface<const char*> {};
-INSTANTIATE_TEST_SUITE_P(SessionMessageList, IgnoredKeyTest,
+class IgnoredKeyTest : public VelaReportingSessionMessageListTest, public ::testing::WithParamInterface<const char*> {};
+INSTANTIATE_TEST_SUITE_P(VelaReportingSessionMessageList, IgnoredKeyTest,
                          ::testing::Values("velareporting_timestamp", "systemuptime_sec", "processuptime_ms"));
 
 TEST_P(IgnoredKeyTest, AnotherTimeIsStillARepeat) {
@@ -82,7 +82,7 @@ TEST_P(IgnoredKeyTest, ATimeThatOnlyTheOldOneHasIsStillARepeat) {
     EXPECT_TRUE(identify(1, 1, {{"a", 1}}));
 }
 
-TEST_F(SessionMessageListTest, PublishedKeysThatNobodyReadsAreComparedLikeOthers) {
+TEST_F(VelaReportingSessionMessageListTest, PublishedKeysThatNobodyReadsAreComparedLikeOthers) {
     identify(1, 1, {{"a", 1}, {"_comparison_field_blacklist", "a"}, {"_throttle_seconds", 60}});
     EXPECT_FALSE(identify(1, 1, {{"a", 2}, {"_comparison_field_blacklist", "a"}, {"_throttle_seconds", 60}}));
     EXPECT_FALSE(identify(1, 1, {{"a", 2}, {"_comparison_field_blacklist", "b"}, {"_throttle_seconds", 60}}));
@@ -90,12 +90,12 @@ TEST_F(SessionMessageListTest, PublishedKeysThatNobodyReadsAreComparedLikeOthers
     EXPECT_TRUE(identify(1, 1, {{"a", 2}, {"_comparison_field_blacklist", "b"}, {"_throttle_seconds", 61}}));
 }
 
-TEST_F(SessionMessageListTest, TheTagCounts) {
+TEST_F(VelaReportingSessionMessageListTest, TheTagCounts) {
     identify(1, 1, {{"audiotag", "a"}});
     EXPECT_FALSE(identify(1, 1, {{"audiotag", "b"}}));
 }
 
-TEST_F(SessionMessageListTest, ValuesAreComparedExactly) {
+TEST_F(VelaReportingSessionMessageListTest, ValuesAreComparedExactly) {
     identify(1, 1, {{"a", 1}});
     EXPECT_FALSE(identify(1, 1, {{"a", true}}));
     EXPECT_FALSE(identify(1, 1, {{"a", 1.0}}));
@@ -104,47 +104,47 @@ TEST_F(SessionMessageListTest, ValuesAreComparedExactly) {
     EXPECT_EQ(count("Generic_Start"), 5U);
 }
 
-TEST_F(SessionMessageListTest, NestedValuesAreCompared) {
+TEST_F(VelaReportingSessionMessageListTest, NestedValuesAreCompared) {
     identify(1, 1, {{"a", Dictionary{{"b", Array{1, 2}}}}});
     EXPECT_TRUE(identify(1, 1, {{"a", Dictionary{{"b", Array{1, 2}}}}}));
     EXPECT_FALSE(identify(1, 1, {{"a", Dictionary{{"b", Array{2, 1}}}}}));
 }
 
-TEST_F(SessionMessageListTest, TimesInsideAValueCount) {
+TEST_F(VelaReportingSessionMessageListTest, TimesInsideAValueCount) {
     identify(1, 1, {{"a", Dictionary{{"velareporting_timestamp", 1}}}});
     EXPECT_FALSE(identify(1, 1, {{"a", Dictionary{{"velareporting_timestamp", 2}}}}));
 }
 
-TEST_F(SessionMessageListTest, TheOrderOfKeysDoesNotMatter) {
+TEST_F(VelaReportingSessionMessageListTest, TheOrderOfKeysDoesNotMatter) {
     identify(1, 1, {{"a", 1}, {"b", 2}});
     EXPECT_TRUE(identify(1, 1, {{"b", 2}, {"a", 1}}));
 }
 
-TEST_F(SessionMessageListTest, AMissingKeyIsADifference) {
+TEST_F(VelaReportingSessionMessageListTest, AMissingKeyIsADifference) {
     identify(1, 1, {{"a", 1}, {"b", 2}});
     EXPECT_FALSE(identify(1, 1, {{"a", 1}}));
     EXPECT_FALSE(identify(1, 1, {{"a", 1}, {"b", 2}}));
 }
 
-TEST_F(SessionMessageListTest, CategoryElevenIsNeverRedundant) {
+TEST_F(VelaReportingSessionMessageListTest, CategoryElevenIsNeverRedundant) {
     identify(11, 1, {{"a", 1}});
     EXPECT_FALSE(identify(11, 1, {{"a", 1}}));
     EXPECT_THAT(keys(), ElementsAre("Error_Start_1", "Error_Start_2"));
 }
 
-TEST_F(SessionMessageListTest, TypeSixIsNeverRedundant) {
+TEST_F(VelaReportingSessionMessageListTest, TypeSixIsNeverRedundant) {
     identify(4, 6, {{"a", 1}});
     EXPECT_FALSE(identify(4, 6, {{"a", 1}}));
     EXPECT_THAT(keys(), ElementsAre("Playback_Error_1", "Playback_Error_2"));
 }
 
-TEST_F(SessionMessageListTest, CategoryElevenWithAFlagMayBeRedundant) {
+TEST_F(VelaReportingSessionMessageListTest, CategoryElevenWithAFlagMayBeRedundant) {
     identify(0x0800000B, 1, {{"a", 1}});
     EXPECT_TRUE(identify(0x0800000B, 1, {{"a", 1}}));
     EXPECT_THAT(keys(), ElementsAre("Session_Error_Start_1"));
 }
 
-TEST_F(SessionMessageListTest, CategoriesAndTypesOfOneNameShareAnIdentifier) {
+TEST_F(VelaReportingSessionMessageListTest, CategoriesAndTypesOfOneNameShareAnIdentifier) {
     identify(0, 0, {{"a", 1}});
     EXPECT_TRUE(identify(16, 0, {{"a", 1}}));
     EXPECT_TRUE(identify(0, 19, {{"a", 1}}));
@@ -154,35 +154,35 @@ TEST_F(SessionMessageListTest, CategoriesAndTypesOfOneNameShareAnIdentifier) {
     EXPECT_THAT(keys(), ElementsAre("Undefined_Generic_1", "Undefined_Generic_2"));
 }
 
-TEST_F(SessionMessageListTest, FlagsWithoutANameShareAnIdentifier) {
+TEST_F(VelaReportingSessionMessageListTest, FlagsWithoutANameShareAnIdentifier) {
     identify(0x00010002, 1, {{"a", 1}});
     EXPECT_TRUE(identify(0x30000002, 1, {{"a", 1}}));
     EXPECT_FALSE(identify(2, 1, {{"a", 1}}));
     EXPECT_THAT(keys(), ElementsAre("_Record_Start_1", "Record_Start_1"));
 }
 
-TEST_F(SessionMessageListTest, OnlyTheLastOfAnIdentifierIsCompared) {
+TEST_F(VelaReportingSessionMessageListTest, OnlyTheLastOfAnIdentifierIsCompared) {
     EXPECT_FALSE(identify(1, 1, {{"a", 1}}));
     EXPECT_FALSE(identify(1, 1, {{"a", 2}}));
     EXPECT_FALSE(identify(1, 1, {{"a", 1}}));
     EXPECT_EQ(count("Generic_Start"), 3U);
 }
 
-TEST_F(SessionMessageListTest, OtherIdentifiersDoNotInterrupt) {
+TEST_F(VelaReportingSessionMessageListTest, OtherIdentifiersDoNotInterrupt) {
     EXPECT_FALSE(identify(1, 1, {{"a", 1}}));
     EXPECT_FALSE(identify(2, 1, {{"a", 1}}));
     EXPECT_TRUE(identify(1, 1, {{"a", 1}}));
 }
 
-TEST_F(SessionMessageListTest, ARepeatIsComparedWithTheStoredMessage) {
+TEST_F(VelaReportingSessionMessageListTest, ARepeatIsComparedWithTheStoredMessage) {
     identify(1, 1, {{"a", 1}, {"velareporting_timestamp", 1}});
     EXPECT_TRUE(identify(1, 1, {{"a", 1}, {"velareporting_timestamp", 2}}));
     EXPECT_TRUE(identify(1, 1, {{"a", 1}, {"velareporting_timestamp", 3}}));
     EXPECT_THAT(recorded(), ElementsAre("Generic_Start_1 {a = 1; velareporting_timestamp = 1;}"));
 }
 
-TEST_F(SessionMessageListTest, WithoutAListNothingIsRecordedOrRedundant) {
-    SessionMessageList none;
+TEST_F(VelaReportingSessionMessageListTest, WithoutAListNothingIsRecordedOrRedundant) {
+    VelaReportingSessionMessageList none;
     const MutexLock lock(none.mutex());
     EXPECT_FALSE(none.createMessageIdentifierWithCategory(1, 1, {{"a", 1}}));
     EXPECT_FALSE(none.createMessageIdentifierWithCategory(1, 1, {{"a", 1}}));
@@ -192,7 +192,7 @@ TEST_F(SessionMessageListTest, WithoutAListNothingIsRecordedOrRedundant) {
     EXPECT_THAT(log_.lines(), IsEmpty());
 }
 
-TEST_F(SessionMessageListTest, ANewListForgetsCountsAndMessages) {
+TEST_F(VelaReportingSessionMessageListTest, ANewListForgetsCountsAndMessages) {
     identify(1, 1, {{"a", 1}});
     {
         const MutexLock lock(list_.mutex());
@@ -205,7 +205,7 @@ TEST_F(SessionMessageListTest, ANewListForgetsCountsAndMessages) {
     EXPECT_THAT(keys(), ElementsAre("Generic_Start_1"));
 }
 
-TEST_F(SessionMessageListTest, AClearedListHoldsNoMessage) {
+TEST_F(VelaReportingSessionMessageListTest, AClearedListHoldsNoMessage) {
     const std::string text(64, 'x');
     const Dictionary message{{"a", std::string_view(text)}};
     identify(1, 1, message);
@@ -290,7 +290,7 @@ Dictionary randomMessage(std::mt19937& random) {
 }
 
 class RandomMessagesTest : public ::testing::TestWithParam<unsigned> {};
-INSTANTIATE_TEST_SUITE_P(SessionMessageList, RandomMessagesTest, ::testing::Range(1U, 9U));
+INSTANTIATE_TEST_SUITE_P(VelaReportingSessionMessageList, RandomMessagesTest, ::testing::Range(1U, 9U));
 
 TEST_P(RandomMessagesTest, AreIdentifiedAsByAWalkFromTheEnd) {
     // Numbers that share names, errors, flags, and more pairs than the list remembers.
@@ -298,7 +298,7 @@ TEST_P(RandomMessagesTest, AreIdentifiedAsByAWalkFromTheEnd) {
                                              16, 17, 0x0800000B, 0x10000004, 0x00010002, 0x30000002, 0xFFFFFFFF};
     constexpr std::uint16_t kTypes[] = {0, 1, 2, 6, 11, 19, 65535};
     std::mt19937 random(GetParam());
-    SessionMessageList list;
+    VelaReportingSessionMessageList list;
     PlainList plain;
     const MutexLock lock(list.mutex());
     list.begin();

@@ -1,4 +1,4 @@
-#include "session/SessionMessageList.h"
+#include "session/VelaReportingSessionMessageList.h"
 
 #include "common/TextFormat.h"
 #include "common/VelaReportingUtility.h"
@@ -23,12 +23,12 @@ bool isError(std::uint32_t category, std::uint32_t type) {
 
 } // namespace
 
-void SessionMessageList::begin() {
+void VelaReportingSessionMessageList::begin() {
     clear();
     exists_ = true;
 }
 
-void SessionMessageList::clear() {
+void VelaReportingSessionMessageList::clear() {
     exists_ = false;
     messages_ = {};
     kinds_ = {};
@@ -36,8 +36,8 @@ void SessionMessageList::clear() {
     recent_ = {};
 }
 
-bool SessionMessageList::createMessageIdentifierWithCategory(std::uint32_t category, std::uint16_t type,
-                                                             const Dictionary& message) {
+bool VelaReportingSessionMessageList::createMessageIdentifierWithCategory(std::uint32_t category, std::uint16_t type,
+                                                                          const Dictionary& message) {
     if (!exists_) {
         return false;
     }
@@ -54,16 +54,17 @@ bool SessionMessageList::createMessageIdentifierWithCategory(std::uint32_t categ
     return false;
 }
 
-std::string SessionMessageList::keyOf(const StoredMessage& message) const {
+std::string VelaReportingSessionMessageList::keyOf(const StoredMessage& message) const {
     return formatText("%@_%u", kinds_[message.kind].identifier, message.count);
 }
 
-std::optional<std::uint32_t> SessionMessageList::messageIdentifierCount(std::string_view identifier) const {
+std::optional<std::uint32_t>
+VelaReportingSessionMessageList::messageIdentifierCount(std::string_view identifier) const {
     const auto found = kindsByIdentifier_.find(std::string(identifier));
     return found == kindsByIdentifier_.end() ? std::nullopt : std::optional(kinds_[found->second].count);
 }
 
-std::uint32_t SessionMessageList::kindOf(std::uint32_t category, std::uint16_t type) {
+std::uint32_t VelaReportingSessionMessageList::kindOf(std::uint32_t category, std::uint16_t type) {
     const std::uint64_t numbers = kKnown | (static_cast<std::uint64_t>(category) << 16U) | type;
     Recent& recent = recent_[(category * 19U + (category >> 24U) + type) % recent_.size()];
     if (recent.numbers != numbers) {
@@ -73,7 +74,7 @@ std::uint32_t SessionMessageList::kindOf(std::uint32_t category, std::uint16_t t
     return recent.kind;
 }
 
-std::uint32_t SessionMessageList::kindOfIdentifier(std::string identifier) {
+std::uint32_t VelaReportingSessionMessageList::kindOfIdentifier(std::string identifier) {
     const auto [place, isNew] = kindsByIdentifier_.try_emplace(identifier, static_cast<std::uint32_t>(kinds_.size()));
     if (isNew) {
         kinds_.push_back({std::move(identifier), 0, 0});
