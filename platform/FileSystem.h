@@ -5,10 +5,25 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <string_view>
 
 namespace vela::platform {
+
+/// A file that is being written and that nobody sees yet. Destroyed without `commit`, it leaves what was there before
+/// and nothing else. One owner at a time; its file system outlives it.
+class PendingFile {
+public:
+    virtual ~PendingFile() = default;
+
+    /// Adds `piece` to the end; pieces of about 1 MiB cost the least. After a failure, that of the creation too, it
+    /// does nothing: `commit` tells.
+    virtual void append(std::string_view piece) = 0;
+
+    /// Puts the file into its place, or answers the first failure. The last call of all.
+    virtual Result<Done> commit() = 0;
+};
 
 /// Thread-safe.
 class FileSystem {
@@ -19,11 +34,17 @@ public:
     /// is refused.
     virtual Result<std::string> readFile(const std::string& path, std::size_t limit) const = 0;
 
-    /// Puts `content` into `path` so that a reader sees the old file or the new one, never a part: a new file beside
-    /// it, opened exclusively and without following links, then renamed. `permissions` hold exactly, whatever the
-    /// umask.
-    virtual Result<Done> writeFileAtomically(const std::string& path, std::string_view content,
-                                             std::uint32_t permissions) = 0;
+    /// Begins a file at `path` that is written in pieces. A reader sees the old file or the whole new one, never a
+    /// part: a new file beside it, opened exclusively and without following links, then renamed. `permissions` hold
+    /// exactly, whatever the umask. Never null.
+    virtual std::unique_ptr<PendingFile> createFile(const std::string& path, std::uint32_t permissions) = 0;
+
+    /// As `createFile`, with all of the content at once.
+    Result<Done> writeFileAtomically(const std::string& path, std::string_view content, std::uint32_t permissions) {
+        const std::unique_ptr<PendingFile> file = createFile(path, permissions);
+        file->append(content);
+        return file->commit();
+    }
 
     /// Creates `path` and the missing folders above it, each new one with exactly `permissions`. A folder that is there
     /// stays as it is.

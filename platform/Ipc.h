@@ -13,10 +13,11 @@
 
 namespace vela::platform {
 
-/// The one error that a client ever gets from an operation.
+/// The one error that a client ever gets from an operation, or word of a limit that the operation passed.
 struct IpcError {
     std::string domain;
     std::int32_t code = 0;
+    std::string limit{}; ///< the limit's name and value; not empty where that is what it is, without domain and code
 };
 
 /// A reply: an error or none, then the value. It may be called from any thread; only the first call is answered.
@@ -33,7 +34,9 @@ public:
     virtual void setServiceType(std::uint16_t serviceType, std::int64_t reportingSession, IpcReply<bool> reply) = 0;
     virtual void getServiceNameForReporterID(std::int64_t reporterID, IpcReply<std::uint16_t> reply) = 0;
     virtual void setConfiguration(Dictionary configuration, std::int64_t forReporterID, IpcReply<bool> reply) = 0;
-    virtual void startReportingSessionForID(std::int64_t reporterID, IpcReply<bool> reply) = 0;
+    /// Its reply may come seconds later. The call counts as under way until the last copy of `underWay` is gone.
+    virtual void startReportingSessionForID(std::int64_t reporterID, std::shared_ptr<void> underWay,
+                                            IpcReply<bool> reply) = 0;
     virtual void sendMessage(Dictionary message, std::uint32_t withCategory, std::uint16_t andType,
                              std::optional<std::vector<std::int64_t>> forReportingIDs, IpcReply<> reply) = 0;
     virtual void stopReportingSessionForID(std::int64_t reporterID, IpcReply<bool> reply) = 0;
@@ -41,6 +44,18 @@ public:
     virtual void reporterID(std::int64_t reporterID, IpcReply<Dictionary> valid) = 0;
     virtual void getAllReporters(IpcReply<std::vector<std::int64_t>> reply) = 0;
     virtual void killService(IpcReply<bool> reply) = 0;
+};
+
+/// What the service tells of itself, read-only. Called on the endpoint's own thread, also while an operation waits; it
+/// does not block for long. Thread-safe.
+class ServiceInspection {
+public:
+    virtual ~ServiceInspection() = default;
+
+    /// Every session of every client, in the registry's order.
+    virtual Array sessions() const = 0;
+    /// What became of everything that was received; empty where nothing is counted.
+    virtual Dictionary ledger() const = 0;
 };
 
 /// One client's connection. Thread-safe.
@@ -73,6 +88,8 @@ public:
 
     /// The delegate outlives the listener.
     virtual void setDelegate(IpcListenerDelegate& delegate) = 0;
+    /// `inspection` outlives the listener.
+    virtual void setInspection(const ServiceInspection& inspection) = 0;
     /// Serves until the process is told to end, and returns then.
     virtual Result<Done> resume() = 0;
 };

@@ -42,4 +42,25 @@ private:
     Mutex& mutex_;
 };
 
+/// A mutex that its owner may take again, for regions that call back into their object.
+class VELA_CAPABILITY("mutex") RecursiveMutex {
+public:
+    void lock() VELA_ACQUIRE() { mutex_.lock(); }
+    void unlock() VELA_RELEASE() { mutex_.unlock(); }
+
+private:
+    std::recursive_mutex mutex_;
+};
+
+class VELA_SCOPED_CAPABILITY RecursiveMutexLock {
+public:
+    explicit RecursiveMutexLock(RecursiveMutex& mutex) VELA_ACQUIRE(mutex) : mutex_(mutex) { mutex_.lock(); }
+    ~RecursiveMutexLock() VELA_RELEASE() { mutex_.unlock(); }
+    RecursiveMutexLock(const RecursiveMutexLock&) = delete;
+    RecursiveMutexLock& operator=(const RecursiveMutexLock&) = delete;
+
+private:
+    RecursiveMutex& mutex_;
+};
+
 } // namespace vela

@@ -21,7 +21,9 @@ class Notifications {
 public:
     virtual ~Notifications() = default;
 
-    /// Calls `handler(token)` on `queue` whenever `name` is posted, until the token is cancelled.
+    /// Calls `handler(token)` on `queue` when `name` is posted, until the token is cancelled. Posts that come close
+    /// behind each other may be one call; a call begins after the last of them. Calls of one token do not overlap.
+    /// `queue` outlives the registration.
     virtual NotificationRegistration registerForNotification(std::string_view name, WorkQueue& queue,
                                                              UniqueFunction<void(std::int32_t token)> handler) = 0;
 

@@ -43,6 +43,15 @@ class CheckIncludesTest(unittest.TestCase):
             "platform/plist/Reader.h": "",
         })
 
+    def test_the_client_library_may_use_the_system_and_its_own_installed_headers(self):
+        self.assert_clean({
+            "client/Link.cpp": "#include <poll.h>\n#include <sys/socket.h>\n#include <vela/reporting.h>\n",
+            "client/include/vela/reporting.h": "#include <stdint.h>\n",
+        })
+        self.assert_faults({
+            "client/Link.cpp": "#include <plist/plist.h>\n",
+        }, "client/Link.cpp:1: client/ includes standard and project headers only, not <plist/plist.h>")
+
     def test_values_include_nothing_but_themselves(self):
         self.assert_faults({
             "platform/Log.h": "",

@@ -1,5 +1,6 @@
 #include "session/VelaReportingSession.h"
 
+#include "common/SettingValues.h"
 #include "common/TextFormat.h"
 #include "common/VelaReportingUtility.h"
 #include "session/SessionLog.h"
@@ -23,7 +24,14 @@ VelaReportingSession::VelaReportingSession(Private, std::int64_t reporterID,
     : reporterID_(reporterID),
       processIdentifiers_(std::move(processIdentifiers)),
       platform_(sessionPlatform),
-      beaconreportingBackendSemaphore_(sessionPlatform.workQueues.makeSemaphore(0)) {
+      beaconreportingBackendSemaphore_(sessionPlatform.workQueues.makeSemaphore(0)),
+      budget_(sessionPlatform.memory == nullptr
+                  ? nullptr
+                  : std::make_shared<VelaReportingSessionBudget>(*sessionPlatform.memory)),
+      ledgerEntry_(sessionPlatform.ledger == nullptr
+                       ? nullptr
+                       : sessionPlatform.ledger->open(processIdentifiers_.empty() ? 0 : processIdentifiers_.front(),
+                                                      reporterID)) {
     const LogReporterScope scope(reporterID_);
     sessionLog().info("created reporting session for ID: %lli", reporterID_);
     platform_.spoor.emit(kTraceInit);
@@ -32,6 +40,7 @@ VelaReportingSession::VelaReportingSession(Private, std::int64_t reporterID,
 VelaReportingSession::~VelaReportingSession() {
     const LogReporterScope scope(reporterID_);
     platform_.spoor.emit(kTraceDealloc);
+    endList();
     sessionLog().info("deallocing this session %lli", reporterID_);
 }
 
@@ -43,6 +52,7 @@ void VelaReportingSession::start() {
         return;
     }
     started_ = true;
+    refusalTold_ = false;
     {
         const MutexLock lock(nestedAggregatedPayloadData_.mutex());
         nestedAggregatedPayloadData_.begin();
@@ -72,11 +82,16 @@ void VelaReportingSession::stop() {
     if (beaconReportingEnabled_) {
         beaconReportingQueue().post([self = shared_from_this()] { self->endBeaconReporting(); });
     }
-    {
-        const MutexLock lock(nestedAggregatedPayloadData_.mutex());
-        nestedAggregatedPayloadData_.clear();
-    }
+    endList();
     started_ = false;
+}
+
+void VelaReportingSession::endList() {
+    const MutexLock lock(nestedAggregatedPayloadData_.mutex());
+    nestedAggregatedPayloadData_.clear();
+    if (budget_ != nullptr) {
+        budget_->give(std::exchange(listBytes_, 0));
+    }
 }
 
 void VelaReportingSession::sendVolumeMessages() {
@@ -91,8 +106,9 @@ void VelaReportingSession::sendVolumeMessages() {
         return;
     }
     sessionLog().standard("sending volume event for reporter %lli", reporterID_);
+    const LedgerScope ledgerScope(ledgerEntry_);
     for (const Dictionary& message : messages) {
-        sendMessage(message, AudioEventCategoryVolume, AudioEventTypeSummary, true, {});
+        shapeAndSend(message, AudioEventCategoryVolume, AudioEventTypeSummary, Limits::Lifted);
         platform_.analytics.handleEvent(message, AudioEventCategoryVolume, AudioEventTypeSummary, shared_from_this());
     }
 }
@@ -101,33 +117,73 @@ void VelaReportingSession::sendSummaryEvent() {
     const std::optional<Dictionary> summary = createSummaryEventForSession();
     if (summary) {
         sessionLog().standard("sending summary event for reporter %lli", reporterID_);
-        sendMessage(*summary, AudioEventCategoryAll, AudioEventTypeUnknown, true, {});
+        shapeAndSend(*summary, AudioEventCategoryAll, AudioEventTypeUnknown, Limits::Lifted);
     }
 }
 
 void VelaReportingSession::sendMessage(const Dictionary& message, std::uint32_t category, std::uint16_t type,
                                        [[maybe_unused]] bool sync, ErrorReply reply) {
+    const std::optional<platform::Failure> refused = shapeAndSend(message, category, type, Limits::Hold);
+    if (reply) {
+        reply(refused);
+    }
+}
+
+// Answers why the message was refused, or none.
+std::optional<platform::Failure> VelaReportingSession::shapeAndSend(const Dictionary& message, std::uint32_t category,
+                                                                    std::uint16_t type, Limits limits) {
     const LogReporterScope scope(reporterID_);
     sessionLog().debug("sending message for session owned by %lli", reporterID_);
     const Dictionary tagged =
         VelaReportingUtilityAddAudioMessageTag(VelaReportingUtilityRemoveWhiteSpaceFromKeys(message), category, type);
+    const bool isForwarded = beaconReportingEnabled_;
+    LedgerItem item(ledgerEntry_, DeliveryBackend::Beacon);
+    // Once for the list, and once for the way to Beacon, where the message may have to wait.
+    VelaReportingSessionShare listShare;
+    VelaReportingSessionShare beaconShare;
+    if (budget_ != nullptr) {
+        const std::uint64_t bytes = memoryOf(Value(tagged));
+        if (const auto limit = budget_->take(isForwarded ? 2 * bytes : bytes, limits == Limits::Lifted)) {
+            item.drop(DropReason::Limit);
+            return refuse(*limit);
+        }
+        listShare = {budget_, bytes};
+        beaconShare = {budget_, isForwarded ? bytes : 0};
+    }
     bool redundant = false;
     {
         const MutexLock lock(nestedAggregatedPayloadData_.mutex());
         redundant = nestedAggregatedPayloadData_.createMessageIdentifierWithCategory(category, type, tagged);
+        if (nestedAggregatedPayloadData_.exists() && !redundant) {
+            listBytes_ += listShare.keep();
+        }
     }
     // The recorded message keeps its time: only what is forwarded loses it.
     Dictionary forwarded = VelaReportingUtilityRemoveEventEpochTime(tagged);
     platform_.spoor.emit(kTraceSend);
     const bool started = started_;
-    if (beaconReportingEnabled_) {
-        BeaconMessage queued{std::move(forwarded), message, category, type, started, redundant};
-        beaconReportingQueue().post(
-            [self = shared_from_this(), queued = std::move(queued)] { self->sendBeaconReportingMessage(queued); });
+    if (isForwarded) {
+        BeaconMessage queued{
+            std::move(forwarded), message, std::move(beaconShare), std::move(item), category, type, started, redundant};
+        beaconReportingQueue().post([self = shared_from_this(), queued = std::move(queued)]() mutable {
+            self->sendBeaconReportingMessage(std::move(queued));
+        });
+    } else {
+        item.drop(DropReason::NotReported);
     }
-    if (reply) {
-        reply(std::nullopt);
+    return std::nullopt;
+}
+
+platform::Failure VelaReportingSession::refuse(VelaReportingMemoryLimit limit) {
+    const VelaReportingSessionLimits& all = budget_->memory().limits();
+    const bool own = limit == VelaReportingMemoryLimit::SessionBytes;
+    const std::string text =
+        formatText("limits.%s is %@", own ? "session_bytes" : "total_bytes",
+                   byteSizeText(static_cast<std::int64_t>(own ? all.sessionBytes : all.totalBytes)));
+    if (!refusalTold_.exchange(true)) {
+        sessionLog().error("reporter %lli keeps no more messages: %@", reporterID_, text);
     }
+    return {0, text};
 }
 
 void VelaReportingSession::setServiceType(std::uint16_t serviceType) {

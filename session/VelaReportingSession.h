@@ -13,20 +13,24 @@
 // While it waits the queue is suspended and no thread is held; messages that are queued meanwhile see the outcome.
 #pragma once
 
+#include "common/DeliveryLedger.h"
 #include "common/VelaReportingVocabulary.h"
 #include "common/values/Dictionary.h"
 #include "platform/Beacon.h"
 #include "platform/Clock.h"
 #include "platform/FileSystem.h"
+#include "platform/HwStats.h"
 #include "platform/JsonWriting.h"
 #include "platform/Mutex.h"
 #include "platform/Spoor.h"
 #include "platform/WorkQueue.h"
+#include "session/VelaReportingSessionMemory.h"
 #include "session/VelaReportingSessionMessageList.h"
 #include "session/VelaReportingStartTransaction.h"
 
 #include <atomic>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -37,6 +41,9 @@
 namespace vela {
 
 class VelaReportingSession;
+
+/// Samples of the audio drivers' statistics at one moment, by the driver's description.
+using VelaReportingDriverSnapShot = std::map<std::string, std::shared_ptr<const platform::HwStatsSamples>, std::less<>>;
 
 /// What the session hands its volume messages to, besides its own send: the analytics bridge.
 class VelaReportingSessionEventHandler {
@@ -56,7 +63,9 @@ struct VelaReportingSessionPlatform {
     platform::Spoor& spoor;
     platform::WorkQueues& workQueues;
     VelaReportingSessionEventHandler& analytics;
-    std::string pathRoot; ///< what absolute paths of the service stand under; empty for "/"
+    std::string pathRoot;                         ///< what absolute paths of the service stand under; empty for "/"
+    VelaReportingSessionMemory* memory = nullptr; ///< bounds what sessions keep; null for no bounds
+    DeliveryLedger* ledger = nullptr;             ///< counts what becomes of messages; null where nobody asks
 };
 
 class VelaReportingSession : public std::enable_shared_from_this<VelaReportingSession> {
@@ -90,7 +99,7 @@ public:
     // Messages.
 
     /// Shapes, records and forwards a message. `sync` has no effect: forwarding is always queued. `reply` (may be
-    /// empty) is called on this thread before that work runs.
+    /// empty) is called on this thread before that work runs; its failure says which memory limit refused the message.
     void sendMessage(const Dictionary& message, std::uint32_t category, std::uint16_t type, bool sync,
                      ErrorReply reply);
     void sendMessage(const Dictionary& message, std::uint32_t category, std::uint16_t type, ErrorReply reply) {
@@ -128,6 +137,12 @@ public:
     void setConfiguration(const std::optional<Dictionary>& configuration);
     void updateConfigurationWithContentsOfConfiguration(const Dictionary& configuration);
 
+    /// Drivers' statistics at the start; none while nobody took them. For the thread that starts and stops the session.
+    const std::optional<VelaReportingDriverSnapShot>& driverSnapShot() const { return driverSnapShot_; }
+    void setDriverSnapShot(std::optional<VelaReportingDriverSnapShot> snapShot) {
+        driverSnapShot_ = std::move(snapShot);
+    }
+
     /// Reply of the start that is under way. Stored when its real-time set-up still goes on, else called at once.
     void setTransactionCompleteBlock(VelaReportingStartTransaction::Block block) {
         transaction_.setBlock(std::move(block));
@@ -147,6 +162,9 @@ public:
 
     bool shouldReportOrientation() const { return false; }
 
+    /// What its deliveries are counted in; null where nobody asks.
+    const std::shared_ptr<LedgerEntry>& ledgerEntry() const { return ledgerEntry_; }
+
     /// One line that names the session, for logs.
     std::string description() const;
 
@@ -160,11 +178,21 @@ private:
     struct BeaconMessage {
         Dictionary forwarded; ///< tagged, without its timestamp where that is taken off
         Dictionary original;  ///< as the client gave it
+        VelaReportingSessionShare share;
+        LedgerItem item;
         std::uint32_t category;
         std::uint16_t type;
         bool started;
         bool redundant;
     };
+    /// How far the list is written to the session file: its messages at one moment, read a stretch at a time.
+    struct MessageReading {
+        std::uint64_t generation = 0;
+        std::size_t next = 0;
+        std::size_t end = 0;
+    };
+    /// Whether the memory limits hold for a message. What the session itself says at its end is never refused.
+    enum class Limits : std::uint8_t { Hold, Lifted };
 
     platform::SerialQueue& beaconReportingQueue();
 
@@ -174,12 +202,17 @@ private:
     void waitForBeaconBackends(std::uint64_t startNumber);
     void finishBeaconSetup(bool signalled);
     void dropBeaconReportingSession();
-    void sendBeaconReportingMessage(const BeaconMessage& message);
+    void sendBeaconReportingMessage(BeaconMessage message);
+    std::optional<platform::Failure> shapeAndSend(const Dictionary& message, std::uint32_t category, std::uint16_t type,
+                                                  Limits limits);
+    platform::Failure refuse(VelaReportingMemoryLimit limit);
     void endBeaconReporting();
+    void endList();
     void sendVolumeMessages();
     void sendSummaryEvent();
     Value applicationName() const;
-    std::optional<std::string> serialisedMessages();
+    bool appendMessages(platform::PendingFile& file, MessageReading reading);
+    std::optional<platform::Failure> appendPiece(std::string& piece, MessageReading& reading);
     std::string summaryFileName();
 
     // Constant after construction.
@@ -187,13 +220,20 @@ private:
     const std::vector<std::int32_t> processIdentifiers_;
     const VelaReportingSessionPlatform& platform_;
     const std::unique_ptr<platform::Semaphore> beaconreportingBackendSemaphore_;
+    const std::shared_ptr<VelaReportingSessionBudget> budget_; ///< null where nothing bounds the session
+    const std::shared_ptr<LedgerEntry> ledgerEntry_;
+
+    // Confined to the thread that starts and stops the session.
+    std::optional<VelaReportingDriverSnapShot> driverSnapShot_;
 
     // Any thread.
     std::atomic<bool> started_ = false;
     std::atomic<bool> beaconReportingEnabled_ = false;
     std::atomic<bool> beaconReportingSessionStarted_ = false;
     std::atomic<std::uint16_t> serviceType_ = AudioServiceTypeUnknown;
+    std::atomic<bool> refusalTold_ = false; ///< since the start
     VelaReportingSessionMessageList nestedAggregatedPayloadData_;
+    std::uint64_t listBytes_ VELA_GUARDED_BY(nestedAggregatedPayloadData_.mutex()) = 0; ///< taken from the budget
     VelaReportingStartTransaction transaction_;
     mutable Mutex configurationMutex_;
     Dictionary configuration_ VELA_GUARDED_BY(configurationMutex_);

@@ -60,6 +60,15 @@ void sendSingleMessageNow(const VelaReportingSessionPlatform& sessionPlatform, c
     }
 }
 
+// What Beacon took is counted by Beacon.
+void endDelivery(LedgerItem& item, const std::optional<platform::Failure>& error) {
+    if (error) {
+        item.drop(DropReason::Failed);
+    } else {
+        item.handOver();
+    }
+}
+
 Dictionary sessionInfo(std::int64_t reporterID, std::uint16_t serviceType, const Value& token,
                        const Dictionary& configuration) {
     const bool batches = VelaReportingUtilityShouldBatchBeaconReportingEventsForServiceType(serviceType);
@@ -147,22 +156,33 @@ void VelaReportingSession::dropBeaconReportingSession() {
     beaconReportingAgentToken_ = Value();
 }
 
-void VelaReportingSession::sendBeaconReportingMessage(const BeaconMessage& message) {
+void VelaReportingSession::sendBeaconReportingMessage(BeaconMessage message) {
     const LogReporterScope scope(reporterID_);
+    const LedgerScope ledgerScope(ledgerEntry_);
     beaconLog().debug("entering beaconreporting %s", __func__);
     if (!message.started) {
         beaconLog().debug("session not started, will send as a single message");
         sendSingleMessage(platform_, message.forwarded, message.category, message.type, serviceType(), configuration(),
-                          {});
+                          [share = std::move(message.share), item = std::move(message.item)](
+                              const std::optional<platform::Failure>& error) mutable { endDelivery(item, error); });
         return;
     }
-    if (!VelaReportingUtilityAllowSessionTransactions() || serviceType() == AudioServiceTypeTest || message.redundant ||
-        beaconReportingSession_ == nullptr || !beaconReportingSessionStarted_) {
+    if (message.redundant) {
+        message.item.repeat();
+        return;
+    }
+    if (!VelaReportingUtilityAllowSessionTransactions() || serviceType() == AudioServiceTypeTest) {
+        message.item.drop(DropReason::NotReported);
+        return;
+    }
+    if (beaconReportingSession_ == nullptr || !beaconReportingSessionStarted_) {
+        message.item.drop(DropReason::NoBackends);
         return;
     }
     const platform::Result<platform::Done> sent = beaconReportingSession_->sendBeaconMessage(
         VelaReportingUtilityRetrieveBeaconReportingCategoryFromCategory(message.category), message.type,
         message.forwarded);
+    endDelivery(message.item, sent ? std::nullopt : std::optional(sent.failure()));
     // A message that could not be sent is passed over without a line: wanted.
     if (sent) {
         beaconLog().debug("BeaconReportingAgent %@ : message %@ : category %i : type %i",
@@ -194,8 +214,9 @@ void VelaReportingSession::sendSingleMessage(const VelaReportingSessionPlatform&
     beaconLog().debug("sending single message after delta %lli for service %i", delta, serviceType);
     // Always one second: that the delta of alarms is only logged is wanted.
     sessionPlatform.workQueues.background().postAfter(
-        std::chrono::seconds(1),
-        [&sessionPlatform, message, category, type, serviceType, reply = std::move(reply)]() mutable {
+        std::chrono::seconds(1), [&sessionPlatform, message, category, type, serviceType,
+                                  entry = LedgerScope::current(), reply = std::move(reply)]() mutable {
+            const LedgerScope ledgerScope(std::move(entry));
             sendSingleMessageNow(sessionPlatform, message, category, type, serviceType, std::move(reply));
         });
 }

@@ -4,6 +4,9 @@
 #include "common/VelaReportingUtility.h"
 #include "session/SessionLog.h"
 
+#include <charconv>
+#include <limits>
+
 namespace vela {
 
 namespace {
@@ -30,7 +33,9 @@ void VelaReportingSessionMessageList::begin() {
 
 void VelaReportingSessionMessageList::clear() {
     exists_ = false;
+    ++generation_;
     messages_ = {};
+    messageCount_ = 0;
     kinds_ = {};
     kindsByIdentifier_ = {};
     recent_ = {};
@@ -51,11 +56,22 @@ bool VelaReportingSessionMessageList::createMessageIdentifierWithCategory(std::u
     ++kind.count;
     kind.last = messages_.size();
     messages_.push_back({number, kind.count, message});
+    messageCount_ = messages_.size();
     return false;
 }
 
 std::string VelaReportingSessionMessageList::keyOf(const StoredMessage& message) const {
-    return formatText("%@_%u", kinds_[message.kind].identifier, message.count);
+    std::string key;
+    appendKeyOf(message, key);
+    return key;
+}
+
+void VelaReportingSessionMessageList::appendKeyOf(const StoredMessage& message, std::string& text) const {
+    std::array<char, std::numeric_limits<std::uint32_t>::digits10 + 1> count{};
+    const char* const end = std::to_chars(count.data(), count.data() + count.size(), message.count).ptr;
+    text += kinds_[message.kind].identifier;
+    text += '_';
+    text.append(count.data(), static_cast<std::size_t>(end - count.data()));
 }
 
 std::optional<std::uint32_t>

@@ -9,6 +9,8 @@
 #include "shaping/StoredMessage.h"
 
 #include <array>
+#include <atomic>
+#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <span>
@@ -28,6 +30,8 @@ public:
     /// No list and no counts; their memory is given back.
     void clear() VELA_REQUIRES(mutex_);
     bool exists() const VELA_REQUIRES(mutex_) { return exists_; }
+    /// Another number for each list: who reads one in several steps sees whether it is still the same.
+    std::uint64_t generation() const VELA_REQUIRES(mutex_) { return generation_; }
 
     /// Gives a tagged message its identifier and count and records it, or answers true when it is redundant: when it
     /// repeats the last one of its identifier, times aside, and is no error. Without a list nothing is recorded or
@@ -36,8 +40,12 @@ public:
         VELA_REQUIRES(mutex_);
 
     std::span<const StoredMessage> messages() const VELA_REQUIRES(mutex_) { return messages_; }
+    /// How many messages there are. Needs no lock and waits for nobody who holds it.
+    std::size_t messageCount() const { return messageCount_; }
     /// The key that a message of this list stands under: "Volume_State_3".
     std::string keyOf(const StoredMessage& message) const VELA_REQUIRES(mutex_);
+    /// Appends that key to `text`.
+    void appendKeyOf(const StoredMessage& message, std::string& text) const VELA_REQUIRES(mutex_);
     /// How many messages of the identifier were kept, or none when there was none.
     std::optional<std::uint32_t> messageIdentifierCount(std::string_view identifier) const VELA_REQUIRES(mutex_);
 
@@ -59,7 +67,9 @@ private:
 
     Mutex mutex_;
     bool exists_ VELA_GUARDED_BY(mutex_) = false;
+    std::uint64_t generation_ VELA_GUARDED_BY(mutex_) = 0;
     std::vector<StoredMessage> messages_ VELA_GUARDED_BY(mutex_);
+    std::atomic<std::size_t> messageCount_ = 0; // written with the lock held
     std::vector<Kind> kinds_ VELA_GUARDED_BY(mutex_);
     std::unordered_map<std::string, std::uint32_t> kindsByIdentifier_ VELA_GUARDED_BY(mutex_);
     std::array<Recent, 32> recent_ VELA_GUARDED_BY(mutex_){};

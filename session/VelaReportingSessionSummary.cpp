@@ -5,8 +5,11 @@
 #include "session/SessionLog.h"
 #include "session/VelaReportingSession.h"
 
-#include <algorithm>
+#include <memory>
+#include <optional>
+#include <span>
 #include <string>
+#include <string_view>
 #include <unordered_map>
 #include <utility>
 #include <vector>
@@ -17,6 +20,8 @@ namespace {
 
 constexpr std::uint32_t kDirectoryPermissions = 0777;
 constexpr std::uint32_t kFilePermissions = 0644;
+/// The session file is made and written in pieces of at least this size, but for the last.
+constexpr std::size_t kPieceBytes = std::size_t{1} << 20U;
 
 // Joins the values of each key, in one walk over the messages. Messages with the keys of the one before need no
 // look-up.
@@ -38,10 +43,12 @@ public:
         }
     }
 
-    Dictionary build() const {
+    /// The last call: the texts go as they are copied, so that those of a long session do not all exist twice.
+    Dictionary build() {
         DictionaryBuilder summary;
-        for (const Column& column : columns_) {
+        for (Column& column : columns_) {
             summary.add(column.key, std::string_view(column.joined));
+            std::string().swap(column.joined);
         }
         return summary.build();
     }
@@ -75,16 +82,6 @@ private:
     std::vector<std::size_t> columnsOfPrevious_;
 };
 
-// When `next` is the message numbered 1,000: makes room for all of them at the length of those so far, so that the text
-// of a long session is not copied while it grows.
-void reserveForAll(std::string& text, std::span<const StoredMessage> messages, const StoredMessage& next) {
-    constexpr std::size_t kSample = 1000;
-    constexpr std::size_t kMostRoom = std::size_t{512} * 1024 * 1024; // a wrong guess must not ask for all there is
-    if (messages.size() > kSample && &next == &messages[kSample]) {
-        text.reserve(std::min(kMostRoom, text.size() / kSample * (messages.size() + messages.size() / 16)));
-    }
-}
-
 } // namespace
 
 std::optional<Dictionary> VelaReportingSession::createSummaryEventForSession() {
@@ -108,19 +105,27 @@ void VelaReportingSession::writeSummaryJson() {
     if (!VelaReportingUtilityIsInternalBuild()) {
         return;
     }
-    const std::optional<std::string> text = serialisedMessages();
-    if (!text) {
+    MessageReading reading;
+    {
+        const MutexLock lock(nestedAggregatedPayloadData_.mutex());
+        reading = {nestedAggregatedPayloadData_.generation(), 0, nestedAggregatedPayloadData_.messages().size()};
+    }
+    if (reading.end == 0) {
         return;
     }
     const std::string directory = platform_.pathRoot + std::string(kSessionFileDirectory);
     const platform::Result<platform::Done> made =
         platform_.fileSystem.createDirectories(directory, kDirectoryPermissions);
+    const std::string path = directory + "/" + summaryFileName();
+    std::unique_ptr<platform::PendingFile> file = platform_.fileSystem.createFile(path, kFilePermissions);
+    if (!appendMessages(*file, reading)) {
+        file = platform_.fileSystem.createFile(path, kFilePermissions); // nothing of the torn text
+    }
+    // Told behind what became of the messages, although it was tried before.
     if (!made) {
         sessionLog().error("can't create logging directory at %@: %@", directory, made.failure().description);
     }
-    const std::string path = directory + "/" + summaryFileName();
-    const platform::Result<platform::Done> written =
-        platform_.fileSystem.writeFileAtomically(path, *text, kFilePermissions);
+    const platform::Result<platform::Done> written = file->commit();
     if (written) {
         sessionLog().info("jsonOutput writeToURL: %@", path);
     } else {
@@ -128,33 +133,51 @@ void VelaReportingSession::writeSummaryJson() {
     }
 }
 
-// The list as a JSON array of one-entry objects; none where there is no message. Objects and array are written here, so
-// that no key is made of every message's identifier and count.
-std::optional<std::string> VelaReportingSession::serialisedMessages() {
+// The list as a JSON array of one-entry objects, in pieces, so that its whole text never exists. False when a message
+// cannot be serialised; that is found, and logged, whether the file can be written or not.
+bool VelaReportingSession::appendMessages(platform::PendingFile& file, MessageReading reading) {
+    std::string piece;
+    piece.reserve(kPieceBytes + kPieceBytes / 8);
+    piece += '[';
+    while (reading.next < reading.end) {
+        if (const std::optional<platform::Failure> failure = appendPiece(piece, reading)) {
+            sessionLog().error("dataWithJSONObject: %@", failure->description);
+            return false;
+        }
+        file.append(piece);
+        piece.clear();
+    }
+    file.append("\n]");
+    return true;
+}
+
+// The next messages of the list, as many as make a piece. The lock is held for no longer than that: what is sent
+// meanwhile stands behind the end of the reading. Objects and array are written here, so that no key is made of every
+// message's identifier and count.
+std::optional<platform::Failure> VelaReportingSession::appendPiece(std::string& piece, MessageReading& reading) {
     constexpr std::size_t kMessageDepth = 2;
+    std::string key;
     const MutexLock lock(nestedAggregatedPayloadData_.mutex());
-    const std::span<const StoredMessage> messages = nestedAggregatedPayloadData_.messages();
-    if (messages.empty()) {
+    if (nestedAggregatedPayloadData_.generation() != reading.generation) {
+        reading.end = reading.next; // the session ended meanwhile, and its list with it
         return std::nullopt;
     }
-    std::string text;
-    char before = '[';
-    for (const StoredMessage& stored : messages) {
-        reserveForAll(text, messages, stored);
-        text += std::exchange(before, ',');
-        text += "\n  {\n    ";
-        appendJsonString(text, nestedAggregatedPayloadData_.keyOf(stored));
-        text += ": ";
+    const std::span<const StoredMessage> messages = nestedAggregatedPayloadData_.messages();
+    for (; reading.next < reading.end && piece.size() < kPieceBytes; ++reading.next) {
+        const StoredMessage& stored = messages[reading.next];
+        key.clear();
+        nestedAggregatedPayloadData_.appendKeyOf(stored, key);
+        piece += reading.next == 0 ? "\n  {\n    " : ",\n  {\n    ";
+        appendJsonString(piece, key);
+        piece += ": ";
         const platform::Result<platform::Done> done =
-            platform_.jsonWriting.append(text, Value(stored.message), JsonLayout::Pretty, kMessageDepth);
+            platform_.jsonWriting.append(piece, Value(stored.message), JsonLayout::Pretty, kMessageDepth);
         if (!done) {
-            sessionLog().error("dataWithJSONObject: %@", done.failure().description);
-            return std::string();
+            return done.failure();
         }
-        text += "\n  }";
+        piece += "\n  }";
     }
-    text += "\n]";
-    return text;
+    return std::nullopt;
 }
 
 std::string VelaReportingSession::summaryFileName() {

@@ -22,6 +22,12 @@ protected:
         session().setServiceType(3);
         return runningSession();
     }
+    /// Seven; a piece of the file ends with every third.
+    void sendLongMessages() {
+        for (int number = 0; number < 7; ++number) {
+            send({{"a", std::string_view(std::string(400'000, static_cast<char>('a' + number)))}});
+        }
+    }
     std::optional<Dictionary> summary() { return session().createSummaryEventForSession(); }
     std::optional<std::string> file() const { return fileSystem_.contentOf(kPath); }
 };
@@ -401,6 +407,96 @@ TEST_F(VelaReportingSessionSummaryTest, JsonThatCannotBeMadeIsLoggedAndTheMethod
                 Contains(sessionLine(LogLevel::Error, "dataWithJSONObject: a value is nested too deeply")));
     EXPECT_EQ(file(), ""); // nothing of the torn text
     EXPECT_EQ(linesSaying("sending summary event for reporter 42"), 1U);
+}
+
+TEST_F(VelaReportingSessionSummaryTest, FailuresAreLoggedInOrderMessageDirectoryFile) {
+    makeInternalBuild();
+    json_.fail("a value is nested too deeply");
+    fileSystem_.addFile("/private", "in the way");
+    startedSession();
+    send({{"a", 1}});
+    log_.clear();
+    session().writeSummaryJson();
+    EXPECT_THAT(
+        log_.lines(),
+        ElementsAre(sessionLine(LogLevel::Error, "dataWithJSONObject: a value is nested too deeply"),
+                    sessionLine(LogLevel::Error, std::string("can't create logging directory at ") + kDirectory +
+                                                     ": create folder " + kDirectory + ": Not a directory"),
+                    sessionLine(LogLevel::Error,
+                                std::string("jsonOutput writeToURL: write ") + kPath + ": No such file or directory")));
+}
+
+TEST_F(VelaReportingSessionSummaryTest, AMessageThatCannotBeSerialisedReplacesAnOlderFileByAnEmptyOne) {
+    makeInternalBuild();
+    startedSession();
+    send({{"a", 1}});
+    session().writeSummaryJson();
+    json_.fail("a value is nested too deeply");
+    session().writeSummaryJson();
+    EXPECT_EQ(file(), "");
+    EXPECT_EQ(fileSystem_.permissionsOf(kPath), 0644U);
+    EXPECT_EQ(log_.lines().back(), sessionLine(LogLevel::Info, std::string("jsonOutput writeToURL: ") + kPath));
+}
+
+TEST_F(VelaReportingSessionSummaryTest, ALongFileIsWrittenInPieces) {
+    makeInternalBuild();
+    startedSession();
+    sendLongMessages();
+    session().writeSummaryJson();
+    const std::string text = file().value_or("");
+    EXPECT_EQ(text.size(), 2'800'618U);
+    EXPECT_TRUE(text.starts_with("[\n  {\n    \"Generic_Start_1\": {\n      \"a\": \"aaaa"));
+    EXPECT_TRUE(text.ends_with("gggg\",\n      \"audiotag\": \"GenericStart\"\n    }\n  }\n]"));
+    for (int number = 2; number <= 7; ++number) {
+        EXPECT_NE(text.find("\n  },\n  {\n    \"Generic_Start_" + std::to_string(number) + "\": {\n"),
+                  std::string::npos)
+            << number;
+    }
+    EXPECT_LT(fileSystem_.longestPiece(), 1'300'000U);
+    EXPECT_GT(fileSystem_.longestPiece(), 1'048'576U);
+}
+
+TEST_F(VelaReportingSessionSummaryTest, WhatIsSentWhileTheFileIsWrittenIsNotInIt) {
+    makeInternalBuild();
+    startedSession();
+    sendLongMessages();
+    fileSystem_.setObserver([this] { send({{"late", 1}}); });
+    session().writeSummaryJson();
+    fileSystem_.setObserver(nullptr);
+    EXPECT_THAT(recordedKeys(), Contains("Generic_Start_8"));
+    const std::string text = file().value_or("");
+    EXPECT_NE(text.find("Generic_Start_7"), std::string::npos);
+    EXPECT_EQ(text.find("Generic_Start_8"), std::string::npos);
+    EXPECT_TRUE(text.ends_with("    }\n  }\n]"));
+}
+
+TEST_F(VelaReportingSessionSummaryTest, AListThatEndsWhileItsFileIsWrittenLeavesWhatWasRead) {
+    makeInternalBuild();
+    startedSession();
+    sendLongMessages();
+    fileSystem_.setObserver([this] {
+        VelaReportingSessionMessageList& list = session().nestedAggregatedPayloadData();
+        const MutexLock lock(list.mutex());
+        list.begin();
+    });
+    session().writeSummaryJson();
+    fileSystem_.setObserver(nullptr);
+    const std::string text = file().value_or("");
+    EXPECT_NE(text.find("Generic_Start_3"), std::string::npos);
+    EXPECT_EQ(text.find("Generic_Start_4"), std::string::npos);
+    EXPECT_TRUE(text.ends_with("    }\n  }\n]"));
+}
+
+TEST_F(VelaReportingSessionSummaryTest, ALongFileThatCannotBeWrittenLeavesTheOldOne) {
+    makeInternalBuild();
+    fileSystem_.addFile(kPath, "old");
+    fileSystem_.limitFileSize(2'000'000);
+    startedSession();
+    sendLongMessages();
+    session().writeSummaryJson();
+    EXPECT_EQ(file(), "old");
+    EXPECT_EQ(log_.lines().back(),
+              sessionLine(LogLevel::Error, std::string("jsonOutput writeToURL: write ") + kPath + ": File too large"));
 }
 
 TEST_F(VelaReportingSessionSummaryTest, AHostileApplicationNameStaysInTheDirectory) {

@@ -1,7 +1,7 @@
 // What every DeviceProperties does, as a test suite that runs on the fake and on the real one.
 //
-// A harness has `const DeviceProperties& properties()` with the boolean property "InternalBuild" true, "Sealed" false,
-// and the feature "Tracing" of "AudioAnalytics" on, "Gauges" of "AudioAnalytics" off; nothing else.
+// A harness has `const DeviceProperties& properties(bool internalBuild)`, whose boolean property "InternalBuild" is
+// that, with the feature "Tracing" of "AudioAnalytics" on, "Gauges" of "AudioAnalytics" off; nothing else.
 #pragma once
 
 #include "platform/DeviceProperties.h"
@@ -14,7 +14,9 @@ namespace vela::testing {
 template <class Harness>
 class DevicePropertiesContract : public ::testing::Test {
 protected:
-    const platform::DeviceProperties& properties() { return harness_.properties(); }
+    const platform::DeviceProperties& properties(bool internalBuild = true) {
+        return harness_.properties(internalBuild);
+    }
 
     Harness harness_;
 };
@@ -22,8 +24,8 @@ protected:
 TYPED_TEST_SUITE_P(DevicePropertiesContract);
 
 TYPED_TEST_P(DevicePropertiesContract, APropertyAnswersItsValue) {
-    EXPECT_EQ(this->properties().booleanProperty("InternalBuild"), std::optional(true));
-    EXPECT_EQ(this->properties().booleanProperty("Sealed"), std::optional(false));
+    EXPECT_EQ(this->properties(true).booleanProperty("InternalBuild"), std::optional(true));
+    EXPECT_EQ(this->properties(false).booleanProperty("InternalBuild"), std::optional(false));
 }
 
 TYPED_TEST_P(DevicePropertiesContract, APropertyThatIsNotSetHasNoAnswer) {

@@ -1,5 +1,6 @@
 #include "testing/FakeFileSystem.h"
 
+#include <algorithm>
 #include <cassert>
 #include <cerrno>
 #include <system_error>
@@ -26,6 +27,37 @@ std::string folderOf(const std::string& path) {
 
 } // namespace
 
+class FakeFileSystem::Pending final : public platform::PendingFile {
+public:
+    Pending(FakeFileSystem& fileSystem, std::string path, std::uint32_t permissions)
+        : fileSystem_(fileSystem),
+          path_(std::move(path)),
+          permissions_(permissions) {}
+
+    void append(std::string_view piece) override {
+        if (error_ == 0) {
+            error_ = fileSystem_.checkPiece(path_, content_.size(), piece);
+        }
+        if (error_ == 0) {
+            content_ += piece;
+        }
+    }
+
+    platform::Result<platform::Done> commit() override {
+        if (error_ != 0) {
+            return failureOf("write", path_, error_);
+        }
+        return fileSystem_.put(path_, std::move(content_), permissions_);
+    }
+
+private:
+    FakeFileSystem& fileSystem_;
+    const std::string path_;
+    const std::uint32_t permissions_;
+    std::string content_;
+    int error_ = 0; ///< the first
+};
+
 FakeFileSystem::FakeFileSystem() {
     const MutexLock lock(mutex_);
     nodes_["/"] = Node{std::nullopt, 0755};
@@ -46,6 +78,16 @@ void FakeFileSystem::setCurrentDirectory(std::string path) {
 void FakeFileSystem::failOn(const std::string& path, int error) {
     const MutexLock lock(mutex_);
     errors_[path] = error;
+}
+
+void FakeFileSystem::limitFileSize(std::optional<std::size_t> bytes) {
+    const MutexLock lock(mutex_);
+    sizeLimit_ = bytes;
+}
+
+void FakeFileSystem::setObserver(std::function<void()> observer) {
+    const MutexLock lock(mutex_);
+    observer_ = std::move(observer);
 }
 
 std::optional<std::string> FakeFileSystem::contentOf(const std::string& path) const {
@@ -71,6 +113,11 @@ std::vector<std::string> FakeFileSystem::files() const {
     return paths;
 }
 
+std::size_t FakeFileSystem::longestPiece() const {
+    const MutexLock lock(mutex_);
+    return longestPiece_;
+}
+
 platform::Result<std::string> FakeFileSystem::readFile(const std::string& path, std::size_t limit) const {
     const MutexLock lock(mutex_);
     if (const int error = errorFor(path); error != 0) {
@@ -90,13 +137,34 @@ platform::Result<std::string> FakeFileSystem::readFile(const std::string& path, 
     return *node->content;
 }
 
-platform::Result<platform::Done> FakeFileSystem::writeFileAtomically(const std::string& path, std::string_view content,
-                                                                     std::uint32_t permissions) {
+std::unique_ptr<platform::PendingFile> FakeFileSystem::createFile(const std::string& path, std::uint32_t permissions) {
+    return std::make_unique<Pending>(*this, path, permissions);
+}
+
+int FakeFileSystem::checkPiece(const std::string& path, std::size_t size, std::string_view piece) {
+    std::function<void()> observer;
+    {
+        const MutexLock lock(mutex_);
+        observer = observer_;
+    }
+    if (observer) {
+        observer();
+    }
+    const MutexLock lock(mutex_);
+    longestPiece_ = std::max(longestPiece_, piece.size());
+    if (const int error = checkWritable(path); error != 0) {
+        return error;
+    }
+    return sizeLimit_ && size + piece.size() > *sizeLimit_ ? EFBIG : 0;
+}
+
+platform::Result<platform::Done> FakeFileSystem::put(const std::string& path, std::string content,
+                                                     std::uint32_t permissions) {
     const MutexLock lock(mutex_);
     if (const int error = checkWritable(path); error != 0) {
         return failureOf("write", path, error);
     }
-    nodes_[path] = Node{std::string(content), permissions};
+    nodes_[path] = Node{std::move(content), permissions};
     return platform::Done();
 }
 

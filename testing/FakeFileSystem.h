@@ -7,7 +7,9 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <map>
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -26,20 +28,26 @@ public:
     void setCurrentDirectory(std::string path);
     /// Every operation on exactly this path fails with `error` (ENOSPC, say); 0 ends it.
     void failOn(const std::string& path, int error);
+    /// Files of more bytes cannot be written (EFBIG); none ends it.
+    void limitFileSize(std::optional<std::size_t> bytes);
+    /// Called for each piece that a file is given, outside the lock.
+    void setObserver(std::function<void()> observer);
 
     // What a test looks at.
     std::optional<std::string> contentOf(const std::string& path) const;
     std::optional<std::uint32_t> permissionsOf(const std::string& path) const;
     /// Paths of all files, sorted.
     std::vector<std::string> files() const;
+    /// Bytes of the longest piece that a file was given so far.
+    std::size_t longestPiece() const;
 
     platform::Result<std::string> readFile(const std::string& path, std::size_t limit) const override;
-    platform::Result<platform::Done> writeFileAtomically(const std::string& path, std::string_view content,
-                                                         std::uint32_t permissions) override;
+    std::unique_ptr<platform::PendingFile> createFile(const std::string& path, std::uint32_t permissions) override;
     platform::Result<platform::Done> createDirectories(const std::string& path, std::uint32_t permissions) override;
     std::string currentDirectory() const override;
 
 private:
+    class Pending;
     struct Node {
         std::optional<std::string> content; ///< none for a folder
         std::uint32_t permissions = 0;
@@ -51,10 +59,16 @@ private:
     /// 0 or an error number.
     int makeFolders(const std::string& path, std::uint32_t permissions) VELA_REQUIRES(mutex_);
     int checkWritable(const std::string& path) const VELA_REQUIRES(mutex_);
+    /// 0 or the error of adding `piece` to a file of `size` bytes at `path`.
+    int checkPiece(const std::string& path, std::size_t size, std::string_view piece) VELA_EXCLUDES(mutex_);
+    platform::Result<platform::Done> put(const std::string& path, std::string content, std::uint32_t permissions);
 
     mutable Mutex mutex_;
     std::map<std::string, Node> nodes_ VELA_GUARDED_BY(mutex_);
     std::map<std::string, int> errors_ VELA_GUARDED_BY(mutex_);
+    std::optional<std::size_t> sizeLimit_ VELA_GUARDED_BY(mutex_);
+    std::function<void()> observer_ VELA_GUARDED_BY(mutex_);
+    std::size_t longestPiece_ VELA_GUARDED_BY(mutex_) = 0;
     std::string currentDirectory_ VELA_GUARDED_BY(mutex_) = "/";
 };
 

@@ -4,8 +4,14 @@
 #include "testing/DevicePropertiesContract.h"
 #include "testing/FakeDeviceProperties.h"
 #include "testing/FakeFileSystem.h"
+#include "testing/FakeNotifications.h"
+#include "testing/FakePreferences.h"
 #include "testing/FakeProcessInformation.h"
 #include "testing/FileSystemContract.h"
+#include "testing/ManualClock.h"
+#include "testing/ManualWorkQueues.h"
+#include "testing/NotificationsContract.h"
+#include "testing/PreferencesContract.h"
 #include "testing/ProcessInformationContract.h"
 
 #include <cerrno>
@@ -26,6 +32,7 @@ struct FileSystemHarness {
     std::string root() { return "/root"; }
     std::optional<std::uint32_t> permissionsOf(const std::string& path) { return fileSystem_.permissionsOf(path); }
     std::vector<std::string> filesBelow() { return fileSystem_.files(); }
+    void limitFileSize(std::optional<std::size_t> bytes) { fileSystem_.limitFileSize(bytes); }
 
     FakeFileSystem fileSystem_;
 };
@@ -43,14 +50,46 @@ struct ProcessInformationHarness {
     FakeProcessInformation processes_{100, "vela-test"};
 };
 
+struct PreferencesHarness {
+    const platform::Preferences& preferences() { return preferences_; }
+    void set(std::string_view domain, std::string_view key, Value value) {
+        preferences_.set(domain, key, std::move(value));
+    }
+    void remove(std::string_view domain, std::string_view key) { preferences_.remove(domain, key); }
+
+    FakePreferences preferences_;
+};
+
+struct NotificationsHarness {
+    platform::Notifications& notifications() { return notifications_; }
+    std::unique_ptr<platform::SerialQueue> makeQueue() {
+        return queues_.makeSerialQueue("notified", platform::QualityOfService::Default);
+    }
+    void post(std::string_view name) { notifications_.post(name); }
+    void post(std::string_view name, std::uint64_t state) {
+        notifications_.setState(name, state);
+        notifications_.post(name);
+    }
+    template <class Done>
+    void settle(const Done& done) {
+        queues_.runUntilIdle();
+        EXPECT_TRUE(done());
+    }
+
+    ManualClock clock_;
+    ManualWorkQueues queues_{clock_};
+    FakeNotifications notifications_;
+};
+
 struct DevicePropertiesHarness {
     DevicePropertiesHarness() {
-        properties_.setBoolean("InternalBuild", true);
-        properties_.setBoolean("Sealed", false);
         properties_.setFeature("AudioAnalytics", "Tracing", true);
         properties_.setFeature("AudioAnalytics", "Gauges", false);
     }
-    const platform::DeviceProperties& properties() { return properties_; }
+    const platform::DeviceProperties& properties(bool internalBuild) {
+        properties_.setBoolean("InternalBuild", internalBuild);
+        return properties_;
+    }
 
     FakeDeviceProperties properties_;
 };
@@ -58,6 +97,8 @@ struct DevicePropertiesHarness {
 } // namespace
 
 INSTANTIATE_TYPED_TEST_SUITE_P(Fake, FileSystemContract, FileSystemHarness);
+INSTANTIATE_TYPED_TEST_SUITE_P(Fake, NotificationsContract, NotificationsHarness);
+INSTANTIATE_TYPED_TEST_SUITE_P(Fake, PreferencesContract, PreferencesHarness);
 INSTANTIATE_TYPED_TEST_SUITE_P(Fake, ProcessInformationContract, ProcessInformationHarness);
 INSTANTIATE_TYPED_TEST_SUITE_P(Fake, DevicePropertiesContract, DevicePropertiesHarness);
 
@@ -127,5 +168,49 @@ TEST(CapturingLogTest, ALineIsPrintedForAPerson) {
 }
 
 } // namespace
+
+TEST(FakeNotificationsTest, ARegistrationThatShallFailAnswersItsStatusAndIsNone) {
+    ManualClock clock;
+    ManualWorkQueues queues(clock);
+    FakeNotifications notifications;
+    notifications.failRegistration("a", 13);
+    const auto failed = notifications.registerForNotification("a", queues.background(), [](std::int32_t) {});
+    EXPECT_EQ(failed.status, 13);
+    EXPECT_EQ(failed.token, -1);
+    EXPECT_THAT(notifications.registrations(), IsEmpty());
+    notifications.failRegistration("a", 0);
+    EXPECT_EQ(notifications.registerForNotification("a", queues.background(), [](std::int32_t) {}).token, 1);
+}
+
+TEST(FakeNotificationsTest, RegistrationsAreListedAsTheyCame) {
+    ManualClock clock;
+    ManualWorkQueues queues(clock);
+    FakeNotifications notifications;
+    for (const std::string_view name : {"b", "a", "b"}) {
+        notifications.registerForNotification(name, queues.background(), [](std::int32_t) {});
+    }
+    notifications.cancel(2);
+    using Registration = FakeNotifications::Registration;
+    EXPECT_THAT(notifications.registrations(), ElementsAre(Registration{"b", 1}, Registration{"b", 3}));
+}
+
+TEST(FakeNotificationsTest, AStateThatIsSetPostsNothingAndMayBeTakenAway) {
+    ManualClock clock;
+    ManualWorkQueues queues(clock);
+    FakeNotifications notifications;
+    const auto registration = notifications.registerForNotification("a", queues.background(), [](std::int32_t) {});
+    notifications.setState("a", 5);
+    EXPECT_EQ(queues.pendingItems(), 0U);
+    EXPECT_EQ(notifications.state(registration.token), std::optional<std::uint64_t>(5));
+    notifications.setState("a", std::nullopt);
+    EXPECT_EQ(notifications.state(registration.token), std::nullopt);
+}
+
+TEST(FakePreferencesTest, QueriesAreCounted) {
+    const FakePreferences preferences;
+    preferences.copyValue("a", "b");
+    preferences.copyValue("a", "b");
+    EXPECT_EQ(preferences.queries(), 2U);
+}
 
 } // namespace vela::testing

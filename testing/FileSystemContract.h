@@ -2,7 +2,8 @@
 //
 // A harness has: `FileSystem& fileSystem()`; `std::string root()`, an empty folder; `std::optional<std::uint32_t>
 // permissionsOf(path)`, none for what is not there; `std::vector<std::string> filesBelow()`, the paths of all files in
-// the root, sorted.
+// the root, sorted; `void limitFileSize(std::optional<std::size_t> bytes)`: files of more bytes cannot be written
+// (EFBIG) until it is called with none.
 #pragma once
 
 #include "platform/FileSystem.h"
@@ -13,6 +14,7 @@
 #include <gtest/gtest.h>
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace vela::testing {
 
@@ -108,6 +110,75 @@ TYPED_TEST_P(FileSystemContract, APathWithANulIsNotCutThere) {
     EXPECT_THAT(this->harness_.filesBelow(), ::testing::IsEmpty());
 }
 
+TYPED_TEST_P(FileSystemContract, AFileOfManyPiecesIsReadWhole) {
+    std::string content;
+    const auto file = this->fileSystem().createFile(this->path("a"), 0640);
+    for (int number = 0; number < 20; ++number) {
+        const std::string piece(1'048'576 + static_cast<std::size_t>(number), static_cast<char>('a' + number));
+        file->append(piece);
+        content += piece;
+    }
+    ASSERT_TRUE(file->commit());
+    const auto read = this->fileSystem().readFile(this->path("a"), 30'000'000);
+    ASSERT_TRUE(read);
+    EXPECT_TRUE(*read == content) << read->size(); // not printed: twenty million bytes
+    EXPECT_EQ(this->harness_.permissionsOf(this->path("a")), 0640U);
+    EXPECT_THAT(this->harness_.filesBelow(), ::testing::ElementsAre(this->path("a")));
+}
+
+TYPED_TEST_P(FileSystemContract, AFileWithoutPiecesIsEmpty) {
+    const auto file = this->fileSystem().createFile(this->path("a"), 0644);
+    file->append("");
+    ASSERT_TRUE(file->commit());
+    EXPECT_EQ(*this->fileSystem().readFile(this->path("a"), 100), "");
+}
+
+TYPED_TEST_P(FileSystemContract, AFileIsNotSeenBeforeItIsWhole) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "old", 0644));
+    const auto file = this->fileSystem().createFile(this->path("a"), 0644);
+    file->append("new");
+    EXPECT_EQ(*this->fileSystem().readFile(this->path("a"), 100), "old");
+    ASSERT_TRUE(file->commit());
+    EXPECT_EQ(*this->fileSystem().readFile(this->path("a"), 100), "new");
+}
+
+TYPED_TEST_P(FileSystemContract, AFileThatIsGivenUpLeavesTheOldOneAndNothingElse) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "old", 0600));
+    auto file = this->fileSystem().createFile(this->path("a"), 0644);
+    file->append("half");
+    file.reset();
+    EXPECT_EQ(*this->fileSystem().readFile(this->path("a"), 100), "old");
+    EXPECT_EQ(this->harness_.permissionsOf(this->path("a")), 0600U);
+    EXPECT_THAT(this->harness_.filesBelow(), ::testing::ElementsAre(this->path("a")));
+}
+
+TYPED_TEST_P(FileSystemContract, APieceThatCannotBeWrittenLeavesTheOldFileAndNothingElse) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "old", 0600));
+    auto file = this->fileSystem().createFile(this->path("a"), 0644);
+    file->append("fits");
+    this->harness_.limitFileSize(4096);
+    file->append(std::string(10'000, 'x'));
+    this->harness_.limitFileSize(std::nullopt);
+    file->append("too late");
+    const auto written = file->commit();
+    file.reset();
+    ASSERT_FALSE(written);
+    EXPECT_EQ(written.failure().code, EFBIG);
+    EXPECT_EQ(written.failure().description, "write " + this->path("a") + ": File too large");
+    EXPECT_EQ(*this->fileSystem().readFile(this->path("a"), 100), "old");
+    EXPECT_EQ(this->harness_.permissionsOf(this->path("a")), 0600U);
+    EXPECT_THAT(this->harness_.filesBelow(), ::testing::ElementsAre(this->path("a")));
+}
+
+TYPED_TEST_P(FileSystemContract, AFileThatCannotBeBegunTellsAtItsEnd) {
+    const auto file = this->fileSystem().createFile(this->path("missing/a"), 0644);
+    ASSERT_NE(file, nullptr);
+    file->append("1");
+    const auto written = file->commit();
+    ASSERT_FALSE(written);
+    EXPECT_EQ(written.failure().code, ENOENT);
+}
+
 TYPED_TEST_P(FileSystemContract, MissingFoldersAreCreatedWithThePermissions) {
     ASSERT_TRUE(this->fileSystem().createDirectories(this->path("a/b/c"), 0750));
     EXPECT_EQ(this->harness_.permissionsOf(this->path("a")), 0750U);
@@ -144,8 +215,12 @@ REGISTER_TYPED_TEST_SUITE_P(FileSystemContract, WhatWasWrittenIsRead, AnEmptyFil
                             AFolderIsNotReadAsAFile, WritingReplacesContentAndPermissions,
                             WritingLeavesNothingElseBehind, WritingIntoAMissingFolderFails,
                             WritingOverAFolderFailsAndLeavesNothingBehind, AnEmptyPathIsRefused,
-                            APathThatEndsInASlashNamesNoFile, APathWithANulIsNotCutThere,
-                            MissingFoldersAreCreatedWithThePermissions, AFolderThatIsThereKeepsItsPermissions,
-                            AFolderMayBeNamedWithASlashAtItsEnd, AFileIsNoFolder, TheCurrentDirectoryIsAbsolute);
+                            APathThatEndsInASlashNamesNoFile, APathWithANulIsNotCutThere, AFileOfManyPiecesIsReadWhole,
+                            AFileWithoutPiecesIsEmpty, AFileIsNotSeenBeforeItIsWhole,
+                            AFileThatIsGivenUpLeavesTheOldOneAndNothingElse,
+                            APieceThatCannotBeWrittenLeavesTheOldFileAndNothingElse,
+                            AFileThatCannotBeBegunTellsAtItsEnd, MissingFoldersAreCreatedWithThePermissions,
+                            AFolderThatIsThereKeepsItsPermissions, AFolderMayBeNamedWithASlashAtItsEnd, AFileIsNoFolder,
+                            TheCurrentDirectoryIsAbsolute);
 
 } // namespace vela::testing

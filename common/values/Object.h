@@ -135,6 +135,9 @@ inline bool releaseIsLast(const Object* object) {
     return object->references.fetch_sub(1, std::memory_order_acq_rel) == 1;
 }
 
+/// Bytes of the value's object and of all inside it; 0 for what is kept in the payload itself.
+std::size_t memoryOf(ValueKind kind, std::uint64_t payload);
+
 /// Destroys an object whose last reference is gone, and gives back what it refers to.
 void destroy(ValueKind kind, std::uint64_t payload);
 

@@ -154,6 +154,38 @@ bool equal(ValueKind leftKind, std::uint64_t left, ValueKind rightKind, std::uin
 
 } // namespace detail
 
+namespace {
+
+template <class Container>
+std::size_t memoryOfContainer(const Container* object) {
+    if (object == nullptr) {
+        return 0;
+    }
+    std::size_t bytes = sizeof(Container) + detail::blockBytes(object->size);
+    for (std::uint32_t slot = 0; slot < object->size; ++slot) {
+        bytes += detail::memoryOf(object->kinds()[slot], object->payloads()[slot]);
+    }
+    return bytes;
+}
+
+} // namespace
+
+std::size_t detail::memoryOf(ValueKind kind, std::uint64_t payload) {
+    switch (kind) {
+    case ValueKind::String:
+    case ValueKind::Data: {
+        const auto* object = objectOf<const BytesObject>(payload);
+        return object == nullptr ? 0 : sizeof(BytesObject) + (object->size + std::size_t{7}) / 8 * 8;
+    }
+    case ValueKind::Array:
+        return memoryOfContainer(objectOf<const ArrayObject>(payload));
+    case ValueKind::Dictionary:
+        return memoryOfContainer(objectOf<const DictionaryObject>(payload));
+    default:
+        return 0;
+    }
+}
+
 Array ValueRef::array() const {
     expect(ValueKind::Array);
     auto* object = detail::objectOf<detail::ArrayObject>(payload_);

@@ -148,6 +148,7 @@ private:
     friend class Value;
     friend class Array;
     friend class Dictionary;
+    friend std::size_t memoryOf(ValueRef value);
     ValueRef(ValueKind kind, std::uint64_t payload) : payload_(payload), kind_(kind) {}
 
     void expect([[maybe_unused]] ValueKind kind) const { assert(kind_ == kind); }
@@ -163,6 +164,10 @@ private:
     std::uint64_t payload_ = 0;
     ValueKind kind_ = ValueKind::None;
 };
+
+/// Bytes of memory that `value` holds: its objects with everything inside them, also what it shares with other values,
+/// without keys and the allocator's own.
+inline std::size_t memoryOf(ValueRef value) { return detail::memoryOf(value.kind_, value.payload_); }
 
 /// Whether two numbers (booleans among them) are equal as numbers, exactly; what is no number equals nothing.
 bool numericallyEqual(ValueRef left, ValueRef right);

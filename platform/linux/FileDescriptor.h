@@ -32,6 +32,8 @@ public:
 
     explicit operator bool() const { return descriptor_ >= 0; }
     int get() const { return descriptor_; }
+    /// Gives it to the caller, whose to close it is.
+    int release() { return std::exchange(descriptor_, -1); }
 
 private:
     int descriptor_ = -1;

@@ -11,8 +11,7 @@ public:
 
     /// The new file is named ".vela-" and sixteen random hexadecimal digits until it is renamed; a crash may leave one
     /// behind. The content is on the disk before the name is, and the name before this answers.
-    Result<Done> writeFileAtomically(const std::string& path, std::string_view content,
-                                     std::uint32_t permissions) override;
+    std::unique_ptr<PendingFile> createFile(const std::string& path, std::uint32_t permissions) override;
 
     Result<Done> createDirectories(const std::string& path, std::uint32_t permissions) override;
 

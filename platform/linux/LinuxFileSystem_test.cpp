@@ -3,11 +3,14 @@
 #include "testing/TemporaryFolder.h"
 
 #include <algorithm>
+#include <csignal>
 #include <filesystem>
 #include <fstream>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <limits>
+#include <optional>
+#include <string>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <thread>
@@ -36,14 +39,41 @@ std::vector<std::string> filesBelow(const std::string& folder) {
     return paths;
 }
 
+/// Files of the process cannot be longer than a limit while this lives.
+class FileSizeScope {
+public:
+    explicit FileSizeScope(std::size_t bytes) {
+        EXPECT_EQ(getrlimit(RLIMIT_FSIZE, &before_), 0);
+        const rlimit limit{bytes, before_.rlim_max};
+        EXPECT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
+    }
+    ~FileSizeScope() {
+        EXPECT_EQ(setrlimit(RLIMIT_FSIZE, &before_), 0);
+        static_cast<void>(signal(SIGXFSZ, handler_));
+    }
+    FileSizeScope(const FileSizeScope&) = delete;
+    FileSizeScope& operator=(const FileSizeScope&) = delete;
+
+private:
+    rlimit before_{};
+    sighandler_t const handler_ = signal(SIGXFSZ, SIG_IGN);
+};
+
 struct LinuxHarness {
     FileSystem& fileSystem() { return fileSystem_; }
     std::string root() { return folder_.path(); }
     std::optional<std::uint32_t> permissionsOf(const std::string& path) { return permissionsAt(path); }
     std::vector<std::string> filesBelow() { return platform::filesBelow(folder_.path()); }
+    void limitFileSize(std::optional<std::size_t> bytes) {
+        fileSize_.reset();
+        if (bytes) {
+            fileSize_.emplace(*bytes);
+        }
+    }
 
     LinuxFileSystem fileSystem_;
     testing::TemporaryFolder folder_;
+    std::optional<FileSizeScope> fileSize_;
 };
 
 } // namespace
@@ -111,14 +141,9 @@ TEST_F(LinuxFileSystemTest, AnOpenReaderKeepsTheOldContent) {
 
 TEST_F(LinuxFileSystemTest, AFailedWriteLeavesTheOldFileAndNothingElse) {
     ASSERT_TRUE(fileSystem_.writeFileAtomically(folder_ / "a", "old", 0644));
-    rlimit before{};
-    ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &before), 0);
-    const rlimit small{4096, before.rlim_max};
-    auto* const handler = signal(SIGXFSZ, SIG_IGN);
-    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
+    std::optional<FileSizeScope> limit(4096);
     const Result<Done> written = fileSystem_.writeFileAtomically(folder_ / "a", std::string(10000, 'x'), 0644);
-    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &before), 0);
-    static_cast<void>(signal(SIGXFSZ, handler));
+    limit.reset();
     ASSERT_FALSE(written);
     EXPECT_EQ(written.failure().code, EFBIG);
     EXPECT_EQ(*fileSystem_.readFile(folder_ / "a", 100), "old");

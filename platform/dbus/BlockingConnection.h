@@ -1,0 +1,65 @@
+// A connection to the service for programs that have nothing to do but wait for its answers: the administrator's tool,
+// tests and benchmarks. Confined to its owner's thread.
+#pragma once
+
+#include "platform/Clock.h"
+#include "platform/Result.h"
+#include "platform/dbus/Address.h"
+#include "platform/dbus/MessageReader.h"
+#include "platform/dbus/MessageWriter.h"
+#include "platform/linux/FileDescriptor.h"
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace vela::platform::dbus {
+
+/// A reply: a return or an error.
+struct Reply {
+    std::unique_ptr<const std::string> message; ///< what the header's texts are views into
+    MessageHeader header;
+
+    bool isError() const { return header.type == MessageType::Error; }
+    /// The text that came with an error; empty when there was none.
+    std::string errorText() const;
+};
+
+class BlockingConnection {
+public:
+    /// Connects and authenticates. The failure's code is that of the system call, or 0 when the service refused or did
+    /// not answer within `patience`.
+    static Result<BlockingConnection> open(const std::vector<SocketAddress>& addresses, Nanoseconds patience);
+
+    /// The serial for the next call, never 0 and never the same again.
+    std::uint32_t nextSerial() { return ++serial_ == 0 ? ++serial_ : serial_; }
+
+    /// Sends the bytes of whole messages, taking in replies meanwhile. They may wait as long as they like.
+    Result<Done> send(std::string_view bytes);
+
+    /// The reply to the call `serial`, in whatever order replies come. Fails when the service closes the connection
+    /// (code ECONNRESET) or says nothing for `patience` (code ETIMEDOUT).
+    Result<Reply> receive(std::uint32_t serial, Nanoseconds patience);
+
+    /// Whether a reply to the call has come in already.
+    bool hasReply(std::uint32_t serial) const { return replies_.contains(serial); }
+
+private:
+    explicit BlockingConnection(FileDescriptor descriptor) : descriptor_(std::move(descriptor)) {}
+
+    Result<Done> authenticate(Nanoseconds patience);
+    Result<Done> waitFor(short events, Nanoseconds patience);
+    Result<Done> takeIn();
+    Result<Done> takeApart();
+
+    FileDescriptor descriptor_;
+    bool authenticated_ = false; ///< what comes in are messages
+    std::uint32_t serial_ = 0;
+    std::string received_;
+    std::map<std::uint32_t, Reply> replies_;
+};
+
+} // namespace vela::platform::dbus

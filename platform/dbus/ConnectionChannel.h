@@ -1,0 +1,97 @@
+// The sending side of a connection, and how much is under way on it. Replies hold it, if need be for longer than the
+// connection lives. Thread-safe.
+//
+// Reading stops (the channel is paused) while too many calls are under way or too many bytes wait for a client that
+// does not read; whoever brings the numbers down rings the endpoint's loop with the connection's token.
+#pragma once
+
+#include "platform/Mutex.h"
+#include "platform/dbus/EventLoop.h"
+#include "platform/dbus/MessageWriter.h"
+#include "platform/linux/FileDescriptor.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+
+namespace vela::platform::dbus {
+
+struct ChannelLimits {
+    std::size_t unsentBytes = 0;
+    std::uint32_t callsInFlight = 0;
+};
+
+class ConnectionChannel {
+public:
+    /// `socket` is connected and does not block. Registers it with `loop`; held until `release`.
+    ConnectionChannel(FileDescriptor socket, std::shared_ptr<EventLoop> loop, std::uint64_t token,
+                      ChannelLimits limits);
+    ConnectionChannel(const ConnectionChannel&) = delete;
+    ConnectionChannel& operator=(const ConnectionChannel&) = delete;
+
+    /// Whether the loop watches the socket; if not, the connection must be given up.
+    bool registered() const { return registered_; }
+
+    /// Sends bytes as they are: for the authentication.
+    void sendBytes(std::string_view bytes);
+
+    /// Sends what `write(writer, serial)` appends. Nothing is sent once the client is gone.
+    template <class Write>
+    void send(const Write& write) {
+        const MutexLock lock(mutex_);
+        if (sending_) {
+            MessageWriter writer(output_);
+            write(writer, nextSerial());
+            flush();
+        }
+    }
+    void callBegins();
+    void callEnds();
+
+    /// Whether the next message may be dispatched. If not, reading stops, and the loop is rung when it may.
+    bool mayProceed();
+    /// Ends the holding.
+    void release();
+    bool held() const;
+
+    /// The socket takes bytes again.
+    void writable();
+    /// The client is gone: nothing is sent any more, and the loop forgets the socket, which may still be read.
+    void hangUp();
+    /// Closes the socket.
+    void close();
+    /// For the endpoint's thread, until `close`.
+    int descriptor() const { return descriptor_; }
+
+private:
+    std::uint32_t nextSerial() VELA_REQUIRES(mutex_) { return ++serial_ == 0 ? ++serial_ : serial_; }
+    std::size_t unsent() const VELA_REQUIRES(mutex_) { return output_.size() - sent_; }
+    void flush() VELA_REQUIRES(mutex_);
+    void discardOutput() VELA_REQUIRES(mutex_);
+    void resumeIfPossible() VELA_REQUIRES(mutex_);
+    void watch(bool reading, bool writing) VELA_REQUIRES(mutex_);
+
+    // Constant after construction.
+    const std::shared_ptr<EventLoop> loop_;
+    const std::uint64_t token_;
+    const ChannelLimits limits_;
+    const int descriptor_;
+    bool registered_ = false;
+
+    mutable Mutex mutex_;
+    FileDescriptor socket_ VELA_GUARDED_BY(mutex_);
+    std::string output_ VELA_GUARDED_BY(mutex_); ///< what was not sent yet, behind `sent_` bytes that were
+    std::size_t sent_ VELA_GUARDED_BY(mutex_) = 0;
+    std::uint32_t serial_ VELA_GUARDED_BY(mutex_) = 0; ///< of the last message sent
+    std::uint32_t inFlight_ VELA_GUARDED_BY(mutex_) = 0;
+    bool sending_ VELA_GUARDED_BY(mutex_) = true;  ///< false once nobody reads
+    bool watched_ VELA_GUARDED_BY(mutex_) = false; ///< by the loop
+    bool reading_ VELA_GUARDED_BY(mutex_) = true;  ///< events that the loop waits for
+    bool writing_ VELA_GUARDED_BY(mutex_) = false;
+    bool paused_ VELA_GUARDED_BY(mutex_) = false;
+    bool held_ VELA_GUARDED_BY(mutex_) = true;
+};
+
+} // namespace vela::platform::dbus

@@ -1,0 +1,58 @@
+#include "platform/dbus/PeerCredentials.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <sys/socket.h>
+
+namespace vela::platform::dbus {
+
+namespace {
+
+// Younger than the C library's headers on some systems.
+constexpr int kPeerGroupsOption = 59;
+constexpr int kPeerPidfdOption = 77;
+
+std::vector<std::uint32_t> peerGroups(int socket) {
+    std::vector<std::uint32_t> groups(16);
+    while (true) {
+        auto bytes = static_cast<socklen_t>(groups.size() * sizeof(std::uint32_t));
+        if (getsockopt(socket, SOL_SOCKET, kPeerGroupsOption, groups.data(), &bytes) == 0) {
+            groups.resize(bytes / sizeof(std::uint32_t));
+            return groups;
+        }
+        const std::size_t needed = bytes / sizeof(std::uint32_t);
+        if (errno != ERANGE || needed <= groups.size()) {
+            return {};
+        }
+        groups.resize(needed);
+    }
+}
+
+} // namespace
+
+bool PeerCredentials::isInGroup(std::uint32_t id) const {
+    return group == id || std::find(groups.begin(), groups.end(), id) != groups.end();
+}
+
+Result<PeerCredentials> peerCredentials(int socket) {
+    ucred credentials{};
+    socklen_t bytes = sizeof(credentials);
+    if (getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &credentials, &bytes) != 0) {
+        return Failure{errno, "cannot tell who is connected"};
+    }
+    PeerCredentials peer;
+    peer.processIdentifier = credentials.pid;
+    peer.user = credentials.uid;
+    peer.group = credentials.gid;
+    peer.groups = peerGroups(socket);
+    return peer;
+}
+
+FileDescriptor peerProcessDescriptor(int socket) {
+    int descriptor = -1;
+    socklen_t bytes = sizeof(descriptor);
+    const bool known = getsockopt(socket, SOL_SOCKET, kPeerPidfdOption, &descriptor, &bytes) == 0;
+    return FileDescriptor(known ? descriptor : -1);
+}
+
+} // namespace vela::platform::dbus

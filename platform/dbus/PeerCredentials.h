@@ -1,0 +1,28 @@
+// Who is at the other end of a socket, by the operating system's word: those who called connect(), whatever became of
+// them since. Immutable.
+#pragma once
+
+#include "platform/Result.h"
+#include "platform/linux/FileDescriptor.h"
+
+#include <cstdint>
+#include <vector>
+
+namespace vela::platform::dbus {
+
+struct PeerCredentials {
+    std::int32_t processIdentifier = 0; ///< 0 where the peer is outside this process's name space
+    std::uint32_t user = 0;
+    std::uint32_t group = 0;
+    std::vector<std::uint32_t> groups; ///< supplementary ones
+
+    bool isInGroup(std::uint32_t id) const;
+};
+
+Result<PeerCredentials> peerCredentials(int socket);
+
+/// A descriptor of the peer's process, which no later process can be taken for; none where the kernel has none to give
+/// (before Linux 6.5) or the peer is gone.
+FileDescriptor peerProcessDescriptor(int socket);
+
+} // namespace vela::platform::dbus

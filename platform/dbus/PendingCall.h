@@ -1,0 +1,87 @@
+// A call that waits for its answer: what the reply objects are made of. It is answered once; one that is destroyed
+// unanswered answers for itself that no reply will come. May move between threads; one owner at a time.
+#pragma once
+
+#include "platform/Ipc.h"
+#include "platform/dbus/ConnectionChannel.h"
+#include "platform/dbus/MessageReader.h"
+
+#include <cstdint>
+#include <memory>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace vela::platform::dbus {
+
+class PendingCall {
+public:
+    /// Counts as under way on the channel until it is answered or destroyed.
+    PendingCall(std::shared_ptr<ConnectionChannel> channel, const MessageHeader& header)
+        : channel_(std::move(channel)),
+          serial_(header.serial),
+          replyExpected_(header.replyExpected()) {
+        channel_->callBegins();
+    }
+    PendingCall(PendingCall&& other) noexcept = default;
+    PendingCall& operator=(PendingCall&&) = delete;
+    ~PendingCall() {
+        if (channel_ != nullptr) {
+            answerError(kNoReplyError, "The service will not answer this call");
+        }
+    }
+
+    /// Sends a return whose arguments `write(writer)` appends. Nothing happens when the call was answered before.
+    template <class Write>
+    void answer(std::string_view signature, const Write& write) {
+        if (const auto channel = std::exchange(channel_, nullptr)) {
+            if (replyExpected_) {
+                channel->send([&](MessageWriter& writer, std::uint32_t serial) {
+                    writer.beginReturn({.serial = serial, .replySerial = serial_, .signature = signature});
+                    write(writer);
+                    if (!writer.finish()) {
+                        writer.error(kLimitsExceededError, "The reply is larger than a message may be",
+                                     {.serial = serial, .replySerial = serial_});
+                    }
+                });
+            }
+            end(*channel);
+        }
+    }
+    void answerEmpty() {
+        answer({}, [](MessageWriter&) {});
+    }
+    void answerError(std::string_view name, std::string_view text);
+    void answerError(const IpcError& error);
+    void answerError(const ProtocolError& error) { answerError(error.name, error.text); }
+    /// Ends it without an answer: its connection is about to be closed.
+    void drop() {
+        if (const auto channel = std::exchange(channel_, nullptr)) {
+            end(*channel);
+        }
+    }
+
+    /// Leaves the counting to the token answered, until its last copy is gone.
+    std::shared_ptr<void> countByToken();
+
+private:
+    void end(ConnectionChannel& channel) const {
+        if (counted_) {
+            channel.callEnds();
+        }
+    }
+
+    std::shared_ptr<ConnectionChannel> channel_; ///< none once answered
+    std::uint32_t serial_;
+    bool replyExpected_;
+    bool counted_ = true;
+};
+
+// The replies of the operations, each of which answers `call`.
+IpcReply<bool> booleanReply(PendingCall call);
+IpcReply<std::uint16_t> uint16Reply(PendingCall call);
+IpcReply<> emptyReply(PendingCall call);
+IpcReply<Dictionary> reporterReply(PendingCall call);
+IpcReply<std::vector<std::int64_t>> reporterIDsReply(PendingCall call);
+
+} // namespace vela::platform::dbus

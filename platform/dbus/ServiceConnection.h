@@ -1,0 +1,120 @@
+// One client's connection to the service: its bytes in, its calls dispatched, its end told. The operations of
+// IpcConnection are thread-safe; everything else is the endpoint's thread's. The endpoint owns it while the socket is
+// open; the service may keep it for longer.
+//
+//     Authenticating --BEGIN, delegate takes it--> Open --end of file--> Ended (invalidation handler)
+//           |                                        `--bytes that are no message--> Ended (interruption handler, then
+//           `--refused, garbage, too late, delegate does not take it--> Ended         invalidation handler)
+#pragma once
+
+#include "platform/Ipc.h"
+#include "platform/Mutex.h"
+#include "platform/dbus/Authentication.h"
+#include "platform/dbus/ConnectionChannel.h"
+#include "platform/dbus/PeerCredentials.h"
+#include "platform/dbus/ServiceCalls.h"
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+
+namespace vela::platform::dbus {
+
+/// What the endpoint gives a new connection.
+struct ConnectionSetup {
+    std::uint64_t number = 0; ///< never used again
+    PeerCredentials peer;
+    FileDescriptor process; ///< the peer's, or none
+    std::shared_ptr<ConnectionChannel> channel;
+    const ServiceFacts* facts = nullptr; ///< outlives the endpoint's hold on the connection
+    std::uint64_t messageBytes = 0;      ///< the longest message that is taken
+    std::string_view serverId;
+    std::string refusal; ///< see ServerAuthentication
+};
+
+class ServiceConnection final : public IpcConnection, public std::enable_shared_from_this<ServiceConnection> {
+public:
+    explicit ServiceConnection(ConnectionSetup setup);
+
+    std::int32_t processIdentifier() const override { return target_.peer.processIdentifier; }
+    void setExportedObject(std::shared_ptr<ReportingServiceProtocol> object) override;
+    void setInterruptionHandler(UniqueFunction<void()> handler) override;
+    void setInvalidationHandler(UniqueFunction<void()> handler) override;
+    /// Before it, calls wait.
+    void resume() override { channel_->release(); }
+    /// `<connection 7 pid 1234 uid 1000>`: numbers alone, so that no client can make it say anything else.
+    std::string description() const override;
+
+    // The endpoint's thread.
+
+    enum class Turn : std::uint8_t {
+        Waiting, ///< for the socket, or for the channel to ring
+        More,    ///< there is more to do at once
+        Ended,   ///< to be ended
+    };
+    /// Reads once at most and dispatches up to kMessagesPerTurn messages, so that no client keeps the others waiting.
+    Turn turn(std::span<char> scratch, IpcListenerDelegate& delegate);
+    /// The client is gone: from now on the limits count no more, and everything that it sent is dispatched.
+    void hangUp();
+    /// Closes the socket and tells the service, once.
+    void end();
+    /// Closes the socket and tells nobody: it is the service that goes, not its client.
+    void abandon();
+    void writable() { channel_->writable(); }
+
+    bool isAuthenticating() const { return state_ == State::Authenticating; }
+    bool isRefused() const { return refused_; }
+    std::uint32_t user() const { return target_.peer.user; }
+    std::uint64_t number() const { return target_.connection; }
+    /// The peer's process, or none; until `end`.
+    int processDescriptor() const { return process_.get(); }
+
+    bool queued = false; ///< for its next turn, by the endpoint
+
+    static constexpr int kMessagesPerTurn = 8;
+
+private:
+    enum class State : std::uint8_t { Authenticating, Open, Ended };
+
+    struct Handlers {
+        UniqueFunction<void()> interruption;
+        UniqueFunction<void()> invalidation;
+    };
+    Handlers close();
+    bool mayProceed() const { return hungUp_ ? !channel_->held() : channel_->mayProceed(); }
+    Turn readOnce(std::span<char> scratch, IpcListenerDelegate& delegate);
+    void takeBuffered(IpcListenerDelegate& delegate);
+    void take(std::string_view& bytes, IpcListenerDelegate& delegate);
+    bool takeAuthentication(std::string_view& bytes, IpcListenerDelegate& delegate);
+    bool takeMessage(std::string_view& bytes);
+    void refuseMessage(const Frame& frame);
+    void dispatch(std::string_view message);
+
+    // Constant after construction.
+    const std::shared_ptr<ConnectionChannel> channel_;
+    const std::uint64_t messageBytes_;
+    const bool refused_;
+
+    // The endpoint's thread's.
+    FileDescriptor process_;
+    CallTarget target_;
+    State state_ = State::Authenticating;
+    std::optional<ServerAuthentication> authentication_;
+    std::string received_; ///< bytes that were not dispatched yet, behind `taken_` that were
+    std::size_t taken_ = 0;
+    std::uint64_t skipped_ = 0; ///< bytes of a message too long that are still to come
+    int budget_ = 0;            ///< messages that this turn may still dispatch
+    bool ending_ = false;       ///< what is left is not wanted
+    bool broken_ = false;       ///< the bytes are no messages
+    bool hungUp_ = false;
+
+    Mutex mutex_;
+    std::shared_ptr<ReportingServiceProtocol> object_ VELA_GUARDED_BY(mutex_);
+    UniqueFunction<void()> interruption_ VELA_GUARDED_BY(mutex_);
+    UniqueFunction<void()> invalidation_ VELA_GUARDED_BY(mutex_);
+};
+
+} // namespace vela::platform::dbus

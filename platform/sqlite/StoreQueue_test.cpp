@@ -1,0 +1,135 @@
+#include "platform/sqlite/StoreQueue.h"
+
+#include <gtest/gtest.h>
+#include <string>
+#include <utility>
+
+namespace vela::platform {
+
+namespace {
+
+const std::optional<MonotonicTime> kPast = MonotonicTime();
+
+StoreRecord record(std::int64_t session = 0) {
+    StoreRecord record;
+    record.session = session;
+    return record;
+}
+
+class StoreQueueTest : public ::testing::Test {
+protected:
+    std::optional<DropReason> push(StoreQueue& queue, StoreRecord record) { return queue.push(record); }
+    /// Whether the writer was called since this was last asked.
+    bool woken(StoreQueue& queue) { return queue.wait(kPast); }
+
+    StoreQueue queue_{{.records = 4, .bytes = 1024 * 1024, .group = 3}};
+};
+
+TEST_F(StoreQueueTest, RecordsComeOutInTheOrderPushed) {
+    push(queue_, record(1));
+    push(queue_, record(2));
+    std::vector<StoreRecord> taken;
+    queue_.take(taken);
+    ASSERT_EQ(taken.size(), 2U);
+    EXPECT_EQ(taken[0].session, 1);
+    EXPECT_EQ(taken[1].session, 2);
+    EXPECT_EQ(queue_.state().waiting, 0U);
+}
+
+TEST_F(StoreQueueTest, MoreRecordsThanItHoldsAreRefusedAndStayWhole) {
+    for (int count = 0; count < 4; ++count) {
+        EXPECT_EQ(push(queue_, record()), std::nullopt);
+    }
+    StoreRecord fifth = record(5);
+    fifth.builder = [] { return Dictionary(); };
+    EXPECT_EQ(queue_.push(fifth), DropReason::QueueFull);
+    EXPECT_EQ(fifth.session, 5);
+    EXPECT_TRUE(fifth.builder);
+}
+
+TEST_F(StoreQueueTest, RecordsThatAreBeingWrittenStillTakeRoom) {
+    for (int count = 0; count < 4; ++count) {
+        push(queue_, record());
+    }
+    std::vector<StoreRecord> taken;
+    queue_.take(taken);
+    EXPECT_EQ(push(queue_, record()), DropReason::QueueFull);
+    queue_.release(1, taken[0].weight);
+    EXPECT_EQ(push(queue_, record()), std::nullopt);
+    EXPECT_EQ(queue_.held(), 4U);
+}
+
+TEST_F(StoreQueueTest, MoreBytesThanItHoldsAreRefused) {
+    StoreQueue queue({.records = 100, .bytes = 10'000, .group = 100});
+    StoreRecord large = record();
+    large.bytes = std::string(6'000, 'x');
+    EXPECT_EQ(push(queue, std::move(large)), std::nullopt);
+    StoreRecord second = record();
+    second.payload = {{"text", std::string_view(std::string(6'000, 'y'))}};
+    EXPECT_EQ(queue.push(second), DropReason::QueueFull);
+    EXPECT_EQ(push(queue, record()), std::nullopt);
+}
+
+TEST_F(StoreQueueTest, ARecordLargerThanAllItsRoomIsRefused) {
+    StoreQueue queue({.records = 100, .bytes = 1'000, .group = 100});
+    StoreRecord large = record();
+    large.bytes = std::string(1'000, 'x');
+    EXPECT_EQ(queue.push(large), DropReason::QueueFull);
+}
+
+TEST_F(StoreQueueTest, TheWriterIsWokenForTheFirstRecordAndForAFullGroup) {
+    EXPECT_FALSE(woken(queue_));
+    push(queue_, record());
+    EXPECT_TRUE(woken(queue_));
+    push(queue_, record());
+    EXPECT_FALSE(woken(queue_));
+    push(queue_, record());
+    EXPECT_TRUE(woken(queue_));
+    push(queue_, record());
+    EXPECT_FALSE(woken(queue_));
+}
+
+TEST_F(StoreQueueTest, TheWriterIsWokenForEachGreaterUrgency) {
+    push(queue_, record());
+    EXPECT_TRUE(woken(queue_));
+    StoreRecord soon = record();
+    soon.urgency = StoreUrgency::Soon;
+    push(queue_, std::move(soon));
+    EXPECT_TRUE(woken(queue_));
+    EXPECT_EQ(queue_.state().urgency, StoreUrgency::Soon);
+    std::vector<StoreRecord> taken;
+    queue_.take(taken);
+    EXPECT_EQ(queue_.state().urgency, StoreUrgency::Usual);
+}
+
+TEST_F(StoreQueueTest, TheWriterIsWokenForTheFirstChangeOfTheLedgerOnly) {
+    queue_.noteLedgerChange();
+    EXPECT_TRUE(woken(queue_));
+    queue_.noteLedgerChange();
+    EXPECT_FALSE(woken(queue_));
+    EXPECT_TRUE(queue_.state().ledgerChanged);
+    queue_.clearLedgerChange();
+    EXPECT_FALSE(queue_.state().ledgerChanged);
+    queue_.noteLedgerChange();
+    EXPECT_TRUE(woken(queue_));
+}
+
+TEST_F(StoreQueueTest, AClosedQueueRefuses) {
+    push(queue_, record());
+    queue_.close();
+    EXPECT_EQ(push(queue_, record()), DropReason::Restart);
+    EXPECT_TRUE(queue_.state().closed);
+    EXPECT_EQ(queue_.state().waiting, 1U);
+}
+
+TEST_F(StoreQueueTest, AFlushThatWasAnsweredIsNotWaitedFor) {
+    const std::uint64_t flush = queue_.requestFlush();
+    EXPECT_TRUE(woken(queue_));
+    EXPECT_EQ(queue_.state().flush, flush);
+    queue_.flushed(flush);
+    queue_.waitFlushed(flush);
+}
+
+} // namespace
+
+} // namespace vela::platform

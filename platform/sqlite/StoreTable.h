@@ -1,0 +1,67 @@
+// The rows of one back end, and the account of them. Confined to the thread that owns the database.
+#pragma once
+
+#include "platform/sqlite/SqliteDatabase.h"
+#include "platform/sqlite/StoreRecord.h"
+
+#include <cstdint>
+#include <string_view>
+
+namespace vela::platform {
+
+/// The row of a back end in the table `backend`.
+struct StoreUsage {
+    std::int64_t rows = 0;
+    std::int64_t bytes = 0; ///< a sum of estimates, see StoreTable::rowBytes
+    std::int64_t evicted = 0;
+    std::int64_t evictedMarks = 0; ///< records that are no deliveries
+    std::int64_t lastEvicted = 0;  ///< number of the newest evicted record
+
+    friend bool operator==(const StoreUsage&, const StoreUsage&) = default;
+};
+
+/// What of a record only the store knows.
+struct StoreRow {
+    std::int64_t seq = 0;
+    std::int64_t shape = 0; ///< 0: `values` is the whole payload
+    std::string_view values;
+};
+
+class StoreTable {
+public:
+    /// `database` outlives the table.
+    StoreTable(SqliteDatabase& database, DeliveryBackend backend) : database_(&database), backend_(backend) {}
+    [[nodiscard]] bool load();
+
+    DeliveryBackend backend() const { return backend_; }
+    const StoreUsage& usage() const { return usage_; }
+    /// Number of the newest record that the table ever held; 0 when there was none.
+    std::int64_t newest() const { return newest_; }
+    std::int64_t oldest();
+
+    /// What a row counts for: about what it takes in the file, its entry in the index included.
+    static std::int64_t rowBytes(std::size_t values, std::size_t name, std::size_t bytes);
+
+    [[nodiscard]] bool insert(const StoreRecord& record, const StoreRow& row);
+    /// Deletes the oldest rows until `bytes` are freed or none is left.
+    [[nodiscard]] bool evict(std::int64_t bytes);
+
+    // The end of a transaction.
+    /// Writes the account when it changed.
+    [[nodiscard]] bool writeUsage();
+    void committed() { kept_ = usage_; }
+    void rolledBack() { usage_ = kept_; }
+
+private:
+    SqliteDatabase* database_;
+    DeliveryBackend backend_;
+    SqliteStatement insert_;
+    SqliteStatement oldest_;
+    SqliteStatement delete_;
+    SqliteStatement account_;
+    StoreUsage usage_;
+    StoreUsage kept_; ///< as the last commit left it
+    std::int64_t newest_ = 0;
+};
+
+} // namespace vela::platform

@@ -1,0 +1,50 @@
+#include "platform/sqlite/StoreTally.h"
+
+#include <algorithm>
+#include <fnmatch.h>
+#include <memory>
+#include <utility>
+
+namespace vela::platform {
+
+StoreTally::StoreTally(DeliveryStore& store, std::vector<std::string> used)
+    : store_(store),
+      patterns_(std::move(used)) {}
+
+bool StoreTally::tallyIsEventUsed(std::string_view eventName) {
+    if (find(eventName).used) {
+        return true;
+    }
+    const std::shared_ptr<LedgerEntry>& account = store_.account();
+    account->received(DeliveryBackend::Tally);
+    account->dropped(DeliveryBackend::Tally, DropReason::NoConsumer);
+    store_.noteLedgerChange();
+    return false;
+}
+
+void StoreTally::tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload) {
+    StoreRecord record = store_.newDelivery(DeliveryBackend::Tally, StoreOperation::Send);
+    record.name = find(eventName).text;
+    record.builder = std::move(payload);
+    store_.add(std::move(record));
+}
+
+StoreTally::Name StoreTally::find(std::string_view eventName) {
+    const MutexLock lock(mutex_);
+    if (const auto found = names_.find(eventName); found != names_.end()) {
+        return found->second;
+    }
+    if (names_.size() >= kMostNames) {
+        names_.clear();
+    }
+    std::string text(eventName);
+    Name name{String(eventName), matches(text)};
+    return names_.emplace(std::move(text), std::move(name)).first->second;
+}
+
+bool StoreTally::matches(const std::string& eventName) const {
+    return std::ranges::any_of(
+        patterns_, [&](const std::string& pattern) { return fnmatch(pattern.c_str(), eventName.c_str(), 0) == 0; });
+}
+
+} // namespace vela::platform
