@@ -40,9 +40,11 @@ platform::Result<CommandLine> readCommandLine(std::span<const std::string_view> 
 }
 
 std::string_view helpText() {
-    return "usage: vela-reportingd --check [--json] [--settings FILE] [--set SECTION.KEY=VALUE]...\n"
+    return "usage: vela-reportingd [--settings FILE] [--set SECTION.KEY=VALUE]...\n"
+           "       vela-reportingd --check [--json] [--settings FILE] [--set SECTION.KEY=VALUE]...\n"
            "\n"
-           "Reporting service of the Vela audio framework. This version only offers --check.\n"
+           "Reporting service of the Vela audio framework. It serves at the socket that the service manager hands\n"
+           "over, else at one of its own in paths.runtime, until it is told to end.\n"
            "\n"
            "  --check                  reads the settings, builds what the service stands on, and says line by line\n"
            "                           what this device offers; exits with 1 when something essential is missing\n"
@@ -52,7 +54,8 @@ std::string_view helpText() {
            "  --version                prints the version\n"
            "  --help                   prints this text\n"
            "\n"
-           "Exit status: 0 done, 1 something essential is missing, 64 wrong usage, 78 wrong settings.\n";
+           "Exit status: 0 ended by a signal or checked, 1 it could not serve or something essential is missing,\n"
+           "2 ended by a client, 64 wrong usage, 78 wrong settings.\n";
 }
 
 } // namespace vela

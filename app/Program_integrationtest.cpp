@@ -100,18 +100,20 @@ TEST_F(ReportingdTest, WrongUsageIsOneLineAndSixtyFour) {
     EXPECT_EQ(refused.error, "vela-reportingd: there is no option --chekc; see --help\n");
 }
 
-TEST_F(ReportingdTest, ServingIsRefusedInOneLine) {
-    const testing::ProgramRun refused = run({});
-    EXPECT_EQ(refused.status, 64);
+TEST_F(ReportingdTest, AFolderThatCannotBeMadeEndsTheStartInOneLine) {
+    const testing::ProgramRun refused =
+        run({"--set", "paths.runtime=/dev/null/vela", "--set", "paths.state=/tmp", "--set",
+             "store.path=" + (folder_ / "deliveries.db"), "--set", "log.target=stderr", "--set", "log.level=error"});
+    EXPECT_EQ(refused.status, 1);
     EXPECT_EQ(refused.out, "");
-    EXPECT_EQ(refused.error, "vela-reportingd: the serving part is not in this version, which only offers --check; see "
-                             "--help\n");
+    EXPECT_THAT(refused.error, HasSubstr("vela-reportingd: "));
+    EXPECT_THAT(refused.error, HasSubstr("/dev/null: Not a directory"));
 }
 
 TEST_F(ReportingdTest, VersionAndHelpArePrinted) {
     EXPECT_EQ(run({"--version"}).out, "vela-reportingd " VELA_VERSION "\n");
     EXPECT_EQ(run({"--version"}).status, 0);
-    EXPECT_THAT(run({"--help"}).out, StartsWith("usage: vela-reportingd --check"));
+    EXPECT_THAT(run({"--help"}).out, StartsWith("usage: vela-reportingd [--settings FILE]"));
     EXPECT_EQ(run({"--help"}).status, 0);
 }
 

@@ -24,13 +24,32 @@ std::unique_ptr<platform::LogSink> makeLog(const Settings& settings, std::string
         kStandardError, platform::isStandardErrorJournal() ? Style::ServiceManager : Style::Words);
 }
 
+/// Where issues are captured, the log's last lines are kept: in `recent`.
+std::unique_ptr<platform::LogSink> keepRecent(const Settings& settings, std::unique_ptr<platform::LogSink> log,
+                                              RecentLog*& recent) {
+    if (!settings.device.internalBuild) {
+        return log;
+    }
+    auto keeping = std::make_unique<RecentLog>(std::move(log));
+    recent = keeping.get();
+    return keeping;
+}
+
 } // namespace
 
-ServicePlatform::ServicePlatform(const Settings& settings) : log_(makeLog(settings, logFailure_)) {
+ServicePlatform::ServicePlatform(const Settings& settings)
+    : log_(keepRecent(settings, makeLog(settings, logFailure_), recentLog_)),
+      deviceProperties_(settings),
+      preferences_(settings.paths.state, fileSystem_, propertyLists_),
+      notifications_(settings.paths.runtime) {
     setLogDestination(log_.get(), settings.log.level);
 }
 
 ServicePlatform::~ServicePlatform() { setLogDestination(nullptr, platform::LogLevel::Error); }
+
+std::vector<std::string> ServicePlatform::recentLog() const {
+    return recentLog_ == nullptr ? std::vector<std::string>() : recentLog_->lines();
+}
 
 CheckedFacts ServicePlatform::facts(const Settings& settings) const {
     CheckedFacts facts;

@@ -1,9 +1,12 @@
 // vela-reportingd: wiring only.
 #include "app/CommandLine.h"
 #include "app/ServiceCheck.h"
+#include "app/ServiceHost.h"
 #include "app/ServicePlatform.h"
+#include "platform/dbus/ServiceEndpoint.h"
 #include "platform/host/HostFacts.h"
 #include "platform/linux/LinuxFileSystem.h"
+#include "platform/linux/ServiceManager.h"
 #include "platform/toml/SettingsLoading.h"
 
 #include <chrono>
@@ -31,16 +34,7 @@ int print(std::string_view text, int status) {
     return std::cout ? status : EXIT_FAILURE;
 }
 
-int check(const CommandLine& line) {
-    const platform::LinuxFileSystem files;
-    const platform::LoadedSettings loaded =
-        platform::loadSettings({line.settingsFile, line.settings, platform::processEnvironment()}, files);
-    if (!loaded.reading.settings) {
-        for (const SettingError& error : loaded.reading.errors) {
-            std::cerr << error.text() << '\n';
-        }
-        return kWrongSettings;
-    }
+int check(const CommandLine& line, const platform::LoadedSettings& loaded) {
     const Settings& settings = *loaded.reading.settings;
     ServicePlatform platform(settings);
     CheckedFacts facts = platform.facts(settings);
@@ -51,10 +45,39 @@ int check(const CommandLine& line) {
                  isSomethingMissing(findings) ? EXIT_FAILURE : EXIT_SUCCESS);
 }
 
+/// Does not come back: what sessions left queued must not find the service half taken down.
+[[noreturn]] void serve(const Settings& settings, platform::ServiceManager& manager) {
+    platform::DbusServiceEndpoint::blockEndSignals(); // before there are other threads
+    ServicePlatform servicePlatform(settings);
+    ServiceHost host(settings, servicePlatform, manager);
+    const platform::Result<platform::Done> served = host.serve();
+    if (!served) {
+        std::cerr << "vela-reportingd: " << served.failure().description << '\n';
+    }
+    std::_Exit(served ? EXIT_SUCCESS : EXIT_FAILURE);
+}
+
+int runWithSettings(const CommandLine& line, platform::ServiceManager& manager) {
+    const platform::LinuxFileSystem files;
+    const platform::LoadedSettings loaded =
+        platform::loadSettings({line.settingsFile, line.settings, platform::processEnvironment()}, files);
+    if (!loaded.reading.settings) {
+        for (const SettingError& error : loaded.reading.errors) {
+            std::cerr << error.text() << '\n';
+        }
+        return kWrongSettings;
+    }
+    if (line.action == CommandLine::Action::Check) {
+        return check(line, loaded);
+    }
+    serve(*loaded.reading.settings, manager);
+}
+
 } // namespace
 
 int main(int argumentCount, char** arguments) {
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN)); // it cannot fail for a signal that exists
+    platform::ServiceManager manager;
     const std::vector<std::string_view> given(arguments + (argumentCount > 0 ? 1 : 0), arguments + argumentCount);
     const platform::Result<CommandLine> line = readCommandLine(given);
     if (!line) {
@@ -66,9 +89,8 @@ int main(int argumentCount, char** arguments) {
     case CommandLine::Action::Version:
         return print("vela-reportingd " VELA_VERSION "\n", EXIT_SUCCESS);
     case CommandLine::Action::Check:
-        return check(*line);
     case CommandLine::Action::Serve:
-        return refuseUsage("the serving part is not in this version, which only offers --check; see --help");
+        return runWithSettings(*line, manager);
     }
     return EXIT_FAILURE;
 }

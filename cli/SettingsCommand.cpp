@@ -1,4 +1,5 @@
 // velactl settings
+#include "cli/SettingsArguments.h"
 #include "cli/Subcommand.h"
 #include "cli/TextTable.h"
 #include "common/CommandOptions.h"
@@ -6,9 +7,6 @@
 #include "common/SettingsTable.h"
 #include "common/values/Dictionary.h"
 #include "common/values/Json.h"
-#include "platform/host/HostFacts.h"
-#include "platform/linux/LinuxFileSystem.h"
-#include "platform/toml/SettingsLoading.h"
 
 #include <array>
 #include <optional>
@@ -86,21 +84,14 @@ int runSettings(std::span<const std::string_view> arguments, Console& console) {
         console.out << exampleSettingsFile();
         return kDone;
     }
-    platform::SettingsRequest request{std::nullopt, read->valuesOf("--set"), platform::processEnvironment()};
-    if (const std::vector<std::string> files = read->valuesOf("--settings"); !files.empty()) {
-        request.file = files.back();
-    }
-    const platform::LoadedSettings loaded = platform::loadSettings(request, platform::LinuxFileSystem());
-    for (const SettingError& error : loaded.reading.errors) {
-        console.error << error.text() << '\n';
-    }
-    if (!loaded.reading.settings) {
+    const std::optional<platform::LoadedSettings> loaded = loadSettingsOf(*read, console);
+    if (!loaded) {
         return kFailed;
     }
     if (read->has("--json")) {
-        printJson(loaded.reading.inForce, console.out);
+        printJson(loaded->reading.inForce, console.out);
     } else {
-        printTable(loaded.reading.inForce, console.out, console.colour);
+        printTable(loaded->reading.inForce, console.out, console.colour);
     }
     return kDone;
 }

@@ -11,7 +11,15 @@ namespace vela {
 
 namespace {
 
-constexpr std::array<Subcommand, 2> kSubcommands{{
+constexpr std::array<Subcommand, 8> kSubcommands{{
+    {"status", "[--json]", "what the service is doing", runStatus},
+    {"sessions", "[--json]", "the reporting sessions of every client", runSessions},
+    {"call", "[OPERATION [JSON]...]", "calls one operation and prints the reply; alone it lists the operations",
+     runCall},
+    {"run", "FILE", "calls what a file of JSON Lines says, over one connection", runRun},
+    {"defaults", "read DOMAIN [KEY] | write DOMAIN KEY VALUE | delete DOMAIN KEY",
+     "reads and changes the preferences that the service reads", runDefaults},
+    {"notify", "NAME [STATE]", "posts a notification", runNotify},
     {"settings", "[--settings FILE] [--set SECTION.KEY=VALUE]... [--json | --example]",
      "the settings in force and where each comes from", runSettings},
     {"plist", "FILE [--to json|xml|binary|text]", "prints a property list in another form", runPlist},

@@ -38,6 +38,12 @@ int runVelactl(std::span<const std::string_view> arguments, Console& console);
 /// Says what is wrong with a subcommand's arguments, and how to use it. Answers kWrongUsage.
 int refuseUsage(std::string_view subcommand, std::string_view reason, Console& console);
 
+int runStatus(std::span<const std::string_view> arguments, Console& console);
+int runSessions(std::span<const std::string_view> arguments, Console& console);
+int runCall(std::span<const std::string_view> arguments, Console& console);
+int runRun(std::span<const std::string_view> arguments, Console& console);
+int runDefaults(std::span<const std::string_view> arguments, Console& console);
+int runNotify(std::span<const std::string_view> arguments, Console& console);
 int runSettings(std::span<const std::string_view> arguments, Console& console);
 int runPlist(std::span<const std::string_view> arguments, Console& console);
 

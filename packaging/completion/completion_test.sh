@@ -10,6 +10,10 @@ source "$here/vela-reportingd"
 # Without an installed velactl: what `velactl settings --json` begins with.
 # shellcheck disable=SC2317  # the completions call it
 velactl() {
+    if [[ $1 == call ]]; then
+        printf '%s\n' 'Operations:' '' '  createReportingSession REPORTER-ID' '  getAllReporters'
+        return
+    fi
     printf '%s\n' '{"key":"log.target","value":"journal","origin":"default"}' \
         '{"key":"log.level","value":"debug","origin":"file","file":"/x","line":2}'
 }
@@ -33,8 +37,13 @@ folder=$(mktemp -d)
 trap 'rm -rf -- "$folder"' EXIT
 : >"$folder/one file.toml"
 
-offers _velactl "settings plist --help --version" velactl ""
-offers _velactl "settings" velactl se
+offers _velactl "status sessions call run defaults notify settings plist --help --version" velactl ""
+offers _velactl "sessions settings" velactl se
+offers _velactl "createReportingSession" velactl call cr
+offers _velactl "read write delete" velactl defaults ""
+offers _velactl "--json" velactl status --j
+offers _velactl "$folder/one file.toml" velactl run "$folder/o"
+offers _velactl "log.level=" velactl notify x --set log.l
 offers _velactl "--settings --set" velactl settings --set
 offers _velactl "log.target= log.level=" velactl settings --set ""
 offers _velactl "log.level=" velactl settings --set log.l
