@@ -11,12 +11,14 @@ namespace vela {
 
 namespace {
 
-constexpr std::array<Subcommand, 8> kSubcommands{{
-    {"status", "[--json]", "what the service is doing", runStatus},
+constexpr std::array<Subcommand, 9> kSubcommands{{
+    {"status", "[--ledger] [--json]", "what the service is doing, and what became of all deliveries", runStatus},
     {"sessions", "[--json]", "the reporting sessions of every client", runSessions},
     {"call", "[OPERATION [JSON]...]", "calls one operation and prints the reply; alone it lists the operations",
      runCall},
     {"run", "FILE", "calls what a file of JSON Lines says, over one connection", runRun},
+    {"deliveries", "[--backend BACKEND] [--session ID] [--since TIME] [--follow] [--json]",
+     "what was delivered to the back ends", runDeliveries},
     {"defaults", "read DOMAIN [KEY] | write DOMAIN KEY VALUE | delete DOMAIN KEY",
      "reads and changes the preferences that the service reads", runDefaults},
     {"notify", "NAME [STATE]", "posts a notification", runNotify},

@@ -42,6 +42,7 @@ int runStatus(std::span<const std::string_view> arguments, Console& console);
 int runSessions(std::span<const std::string_view> arguments, Console& console);
 int runCall(std::span<const std::string_view> arguments, Console& console);
 int runRun(std::span<const std::string_view> arguments, Console& console);
+int runDeliveries(std::span<const std::string_view> arguments, Console& console);
 int runDefaults(std::span<const std::string_view> arguments, Console& console);
 int runNotify(std::span<const std::string_view> arguments, Console& console);
 int runSettings(std::span<const std::string_view> arguments, Console& console);

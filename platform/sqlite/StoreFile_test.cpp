@@ -206,6 +206,7 @@ TEST_F(StoreFileTest, AReaderThatStandsStillCannotMakeTheLogGrowForEver) {
     std::string failure;
     for (int round = 0; round < 200 && failure.empty(); ++round) {
         std::vector<StoreRecord> group;
+        group.reserve(50);
         for (int number = 0; number < 50; ++number) {
             group.push_back(record(DeliveryBackend::Beacon, {{"text", std::string_view(text)}}));
         }
