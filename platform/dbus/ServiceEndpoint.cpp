@@ -260,7 +260,8 @@ void DbusServiceEndpoint::end(const std::shared_ptr<dbus::ServiceConnection>& co
     }
     if (connection->isRefused()) {
         --lingering_;
-    } else if (const auto place = connectionsOfUser_.find(connection->user()); --place->second == 0) {
+    } else if (const auto place = connectionsOfUser_.find(connection->user());
+               place != connectionsOfUser_.end() && --place->second == 0) {
         connectionsOfUser_.erase(place);
     }
     connection->end();
