@@ -48,7 +48,7 @@ platform::Result<platform::Done> ServiceHost::serve() {
     listener.setDelegate(*delegate_);
     listener.setInspection(*delegate_);
     static_cast<void>(manager_.tellReady());
-    const platform::Result<platform::Done> served = listener.resume();
+    platform::Result<platform::Done> served = listener.resume();
     static_cast<void>(manager_.tellStopping());
     handleWhatIsQueued();
     backends_->close();
