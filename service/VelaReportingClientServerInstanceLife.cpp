@@ -1,6 +1,6 @@
 // Start and stop of a client's sessions, and the end of its connection. Only the start counts a session as active and
 // only the stop takes it off again: one that is destroyed, replaced or lost with its connection stays counted, and
-// after six of those no new session reports in real time. Wanted.
+// after five of those no session that starts reports in real time. Wanted.
 #include "common/VelaReportingUtility.h"
 #include "service/ServiceLog.h"
 #include "service/VelaReportingClientServerInstance.h"
