@@ -46,6 +46,8 @@ std::optional<std::string> fromBase64(std::string_view text) {
 /// Takes the parser's events and builds the value. Every event answers whether to go on.
 class ValueHandler {
 public:
+    // Names and types are the parser's.
+    // NOLINTBEGIN(readability-identifier-naming)
     using number_integer_t = nlohmann::json::number_integer_t;
     using number_unsigned_t = nlohmann::json::number_unsigned_t;
     using number_float_t = nlohmann::json::number_float_t;
@@ -54,8 +56,6 @@ public:
 
     explicit ValueHandler(std::size_t depth) : depth_(depth) {}
 
-    // Names and types are the parser's.
-    // NOLINTBEGIN(readability-identifier-naming)
     bool null() { return refuse("null is no value of a property list"); }
     bool boolean(bool value) { return put(value); }
     bool number_integer(number_integer_t value) { return put(value); }

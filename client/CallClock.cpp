@@ -3,10 +3,10 @@
 #include "platform/linux/FileDescriptor.h"
 
 #include <charconv>
+#include <ctime>
 #include <fcntl.h>
 #include <string>
 #include <system_error>
-#include <time.h>
 #include <unistd.h>
 
 namespace vela::client {

@@ -7,6 +7,7 @@ namespace vela::client {
 
 WaitingCalls::Waiter::Waiter(WaitingCalls& calls) : calls_(calls) {
     const std::scoped_lock lock(calls_.mutex_);
+    // NOLINTNEXTLINE(cppcoreguidelines-prefer-member-initializer): read under the lock
     ticket_ = calls_.nextTicket_++;
     calls_.waiters_.emplace(ticket_, this);
 }

@@ -1,5 +1,5 @@
 // Reports one session of an audio process, in C++. Prints what became of it.
-#include <cstdio>
+#include <iostream>
 #include <vela/reporting.hpp>
 
 int main() {
@@ -21,10 +21,10 @@ int main() {
         reporting::Error error{};
         const auto reporter = client.reporter(kReporterID, 5s, &error);
         if (!reporter) {
-            std::fprintf(stderr, "no answer: %s %s\n", error.name, error.text);
+            std::cerr << "no answer: " << error.name << " " << error.text << "\n";
             return 1;
         }
-        std::printf("service type %d\n", int{reporter->serviceType});
+        std::cout << "service type " << reporter->serviceType << "\n";
 
         // This may stand in the audio callback: it returns at once, whatever the service does.
         const reporting::Value channels[] = {"left", "right"};
@@ -37,6 +37,6 @@ int main() {
     }
     const auto dropped = client.state().droppedQueueFull;
     const reporting::Status status = client.end();
-    std::printf("dropped %d, %s\n", static_cast<int>(dropped), reporting::textOf(status));
+    std::cout << "dropped " << dropped << ", " << reporting::textOf(status) << "\n";
     return status == VelaReportingStatusOk ? 0 : 1;
 }

@@ -29,7 +29,7 @@
 
 namespace vela::platform {
 
-struct DbusServiceOptions { // NOLINT(clang-analyzer-optin.performance.Padding): its order is for its readers
+struct DbusServiceOptions {
     // Where clients arrive.
     int listeningDescriptor = -1; ///< from the service manager, taken over; without one:
     std::string socketPath;       ///< in a folder that exists
