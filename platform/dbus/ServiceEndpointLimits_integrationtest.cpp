@@ -321,7 +321,16 @@ TEST(ServiceEndpointLimitsTest, AThousandClientsAreServed) { serveMany(1000); }
 
 TEST(ServiceEndpointLimitsTest, FiveThousandClientsAreServed) { serveMany(5000); }
 
+#if defined(__has_feature)
+#if __has_feature(undefined_behavior_sanitizer)
+#define VELA_CHECKS_NEED_DESCRIPTORS
+#endif
+#endif
+
 TEST(ServiceEndpointLimitsTest, WithoutDescriptorsClientsWaitAndTheLoopDoesNotSpin) {
+#ifdef VELA_CHECKS_NEED_DESCRIPTORS
+    GTEST_SKIP() << "the sanitizer opens pipes to look at objects, and takes those for broken where it cannot";
+#endif
     std::atomic<int> turns{0};
     DbusServiceOptions options;
     options.onLoopTurn = [&turns] { ++turns; };
