@@ -9,7 +9,7 @@ namespace vela::platform::dbus {
 
 namespace {
 
-using std::string_view_literals::operator""sv;
+using std::string_view_literals::operator""sv; // NOLINT(misc-unused-using-decls): it is used
 
 /// So many lines may be answered before the attempt counts as failed.
 constexpr int kMostAnswers = 16;

@@ -19,10 +19,9 @@ ConnectionChannel::ConnectionChannel(FileDescriptor socket, std::shared_ptr<Even
       token_(token),
       limits_(limits),
       descriptor_(socket.get()),
-      socket_(std::move(socket)) {
-    registered_ = loop_->add(descriptor_, EPOLLIN, token_);
-    watched_ = registered_;
-}
+      registered_(loop_->add(descriptor_, EPOLLIN, token_)),
+      socket_(std::move(socket)),
+      watched_(registered_) {}
 
 void ConnectionChannel::sendBytes(std::string_view bytes) {
     const MutexLock lock(mutex_);

@@ -109,7 +109,7 @@ public:
 
 private:
     Value value(std::string_view type);
-    Value valueOf(char basicType);
+    Value valueOf(char code);
     Value date();
     Value array(std::string_view elementType);
     void entry(DictionaryBuilder& builder);

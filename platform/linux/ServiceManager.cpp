@@ -21,11 +21,11 @@ namespace {
 
 constexpr int kFirstDescriptor = 3;
 
-/// The environment variable's text, which is gone afterwards; empty where it was not set.
+/// The environment variable's text, which is gone afterwards; empty where it was not set. Before there are threads.
 std::string takeVariable(const char* name) {
-    const char* const text = std::getenv(name);
+    const char* const text = std::getenv(name); // NOLINT(concurrency-mt-unsafe)
     std::string taken = text == nullptr ? "" : text;
-    unsetenv(name);
+    unsetenv(name); // NOLINT(concurrency-mt-unsafe)
     return taken;
 }
 
