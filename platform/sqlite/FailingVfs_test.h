@@ -30,6 +30,8 @@ public:
 
     /// Every write and flush answers this code (SQLITE_FULL, SQLITE_IOERR_WRITE) until it is SQLITE_OK again.
     void fail(int code) { writeError = code; }
+    /// How often a file was made durable since the process began.
+    static int syncsSoFar() { return syncs; }
 
 private:
     struct File {
@@ -38,6 +40,7 @@ private:
     };
 
     static inline std::atomic<int> writeError{SQLITE_OK};
+    static inline std::atomic<int> syncs{0};
 
     static sqlite3_file* real(sqlite3_file* file) { return reinterpret_cast<File*>(file)->real(); }
     static const sqlite3_io_methods* of(sqlite3_file* file) { return real(file)->pMethods; }
@@ -59,7 +62,10 @@ private:
             return writeError != SQLITE_OK ? writeError.load() : of(f)->xWrite(real(f), from, bytes, at);
         },
         [](sqlite3_file* f, sqlite3_int64 size) { return of(f)->xTruncate(real(f), size); },
-        [](sqlite3_file* f, int flags) { return writeError != SQLITE_OK ? SQLITE_IOERR_FSYNC : of(f)->xSync(real(f), flags); },
+        [](sqlite3_file* f, int flags) {
+            ++syncs;
+            return writeError != SQLITE_OK ? SQLITE_IOERR_FSYNC : of(f)->xSync(real(f), flags);
+        },
         [](sqlite3_file* f, sqlite3_int64* size) { return of(f)->xFileSize(real(f), size); },
         [](sqlite3_file* f, int kind) { return of(f)->xLock(real(f), kind); },
         [](sqlite3_file* f, int kind) { return of(f)->xUnlock(real(f), kind); },

@@ -14,6 +14,8 @@ constexpr std::chrono::milliseconds kSoon{5};
 constexpr std::chrono::seconds kLongestRetryDelay{30};
 /// Memory for more records than this is given back after a burst.
 constexpr std::size_t kRecordsKept = 4096;
+/// Of a backlog, so many share a commit at the most.
+constexpr std::size_t kMostTogether = 1024;
 
 /// Whether a file that could not be opened may be opened later without anybody's doing.
 bool mayPass(int error) {
@@ -152,7 +154,9 @@ bool StoreWriter::takeMore() {
 
 std::span<StoreRecord> StoreWriter::nextGroup() {
     const std::span<StoreRecord> left = std::span(taken_).subspan(settled_);
-    const std::size_t most = std::min(left.size(), options_.commitMessages);
+    // What waits already shares the cost of one commit; in small steps while commits fail.
+    const std::size_t most =
+        std::min(left.size(), retryAt_ ? options_.commitMessages : std::max(options_.commitMessages, kMostTogether));
     const std::size_t mostBytes = file_ == nullptr ? 0 : file_->groupBytes();
     std::size_t count = 1;
     for (std::size_t bytes = left[0].weight; count < most && bytes + left[count].weight <= mostBytes; ++count) {
@@ -169,7 +173,8 @@ bool StoreWriter::store(std::span<StoreRecord> group, MonotonicTime now) {
         }
     }
     const Result<Done> stored = attempt(group);
-    settle(group, static_cast<bool>(stored));
+    // Of a failed commit only the first are given up; the others wait for an attempt that works.
+    settle(stored ? group : group.first(std::min(group.size(), options_.commitMessages)), static_cast<bool>(stored));
     if (stored) {
         noteSuccess();
     } else {

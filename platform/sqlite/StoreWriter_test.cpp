@@ -79,12 +79,18 @@ TEST_F(StoreWriterTest, AFullGroupIsCommittedAtOnce) {
     EXPECT_EQ(delivered(), 3U);
 }
 
-TEST_F(StoreWriterTest, MoreThanAGroupIsCommittedInGroups) {
+TEST_F(StoreWriterTest, ABacklogSharesOneCommit) {
     open();
-    push(8);
+    push(3);
+    int before = FailingVfs::syncsSoFar();
     run(0);
-    EXPECT_EQ(delivered(), 8U);
+    const int syncsOfACommit = FailingVfs::syncsSoFar() - before;
+    push(80);
+    before = FailingVfs::syncsSoFar();
+    run(1);
+    EXPECT_EQ(delivered(), 83U);
     EXPECT_EQ(queue_.held(), 0U);
+    EXPECT_LE(FailingVfs::syncsSoFar() - before, syncsOfACommit);
 }
 
 TEST_F(StoreWriterTest, AnUrgentRecordIsCommittedAtOnceWithThoseBeforeIt) {
