@@ -26,6 +26,7 @@ ServiceHost::ServiceHost(const Settings& settings, ServicePlatform& servicePlatf
       buildType_(servicePlatform.deviceProperties()),
       ledger_(servicePlatform.processes().ownPid()),
       memory_({settings.limits.sessionBytes, settings.limits.totalBytes}),
+      hwStats_(platform::hwStatsOptionsOf(settings), servicePlatform.clock()),
       probe_(servicePlatform.queues().background()) {}
 
 platform::Result<platform::Done> ServiceHost::serve() {

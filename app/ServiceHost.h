@@ -10,6 +10,7 @@
 #include "platform/Ipc.h"
 #include "platform/absent/AbsentFacilities.h"
 #include "platform/dbus/ServiceEndpoint.h"
+#include "platform/hwstats/LinuxHwStats.h"
 #include "platform/linux/ServiceManager.h"
 #include "service/VelaReportingServiceDelegate.h"
 
@@ -40,7 +41,7 @@ private:
     const VelaReportingBuildType buildType_;
     DeliveryLedger ledger_;
     VelaReportingSessionMemory memory_;
-    platform::AbsentHwStats hwStats_;
+    platform::LinuxHwStats hwStats_;
     platform::AbsentSpoor spoor_;
     platform::AbsentProbe probe_;
     platform::AbsentMetricsheet metricsheet_;

@@ -49,15 +49,17 @@ TEST_F(VelactlProgramTest, SettingsAreAnAlignedTableWithoutColour) {
     EXPECT_EQ(shown.status, 0);
     EXPECT_EQ(shown.error, "");
     const std::string rows = std::regex_replace(shown.out, std::regex(file()), "FILE");
-    EXPECT_THAT(rows, StartsWith("KEY                              VALUE               FROM\n"
-                                 "device.InternalBuild             false               default\n"
-                                 "features.AudioAnalytics/Tracing  false               default\n"
-                                 "paths.root                       \"/\"                 default\n"
-                                 "paths.state                      \"/s\"                FILE:2\n"
-                                 "paths.runtime                    \"/r\"                FILE:3\n"
-                                 "log.target                       \"stderr\"            --set\n"
-                                 "log.level                        \"debug\"             FILE:5\n"
-                                 "store.path                       \"/s/deliveries.db\"  default\n"));
+    EXPECT_THAT(
+        rows,
+        StartsWith("KEY                              VALUE                                             FROM\n"
+                   "device.InternalBuild             false                                             default\n"
+                   "features.AudioAnalytics/Tracing  false                                             default\n"
+                   "paths.root                       \"/\"                                               default\n"
+                   "paths.state                      \"/s\"                                              FILE:2\n"
+                   "paths.runtime                    \"/r\"                                              FILE:3\n"
+                   "log.target                       \"stderr\"                                          --set\n"
+                   "log.level                        \"debug\"                                           FILE:5\n"
+                   "store.path                       \"/s/deliveries.db\"                                default\n"));
 }
 
 TEST_F(VelactlProgramTest, SettingsAreJsonLines) {

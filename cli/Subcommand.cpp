@@ -11,7 +11,7 @@ namespace vela {
 
 namespace {
 
-constexpr std::array<Subcommand, 9> kSubcommands{{
+constexpr std::array<Subcommand, 10> kSubcommands{{
     {"status", "[--ledger] [--json]", "what the service is doing, and what became of all deliveries", runStatus},
     {"sessions", "[--json]", "the reporting sessions of every client", runSessions},
     {"call", "[OPERATION [JSON]...]", "calls one operation and prints the reply; alone it lists the operations",
@@ -22,6 +22,8 @@ constexpr std::array<Subcommand, 9> kSubcommands{{
     {"defaults", "read DOMAIN [KEY] | write DOMAIN KEY VALUE | delete DOMAIN KEY",
      "reads and changes the preferences that the service reads", runDefaults},
     {"notify", "NAME [STATE]", "posts a notification", runNotify},
+    {"drivers", "[--settings FILE] [--set SECTION.KEY=VALUE]... [--watch [--count N]] [--json]",
+     "the channels of driver statistics and their values", runDrivers},
     {"settings", "[--settings FILE] [--set SECTION.KEY=VALUE]... [--json | --example]",
      "the settings in force and where each comes from", runSettings},
     {"plist", "FILE [--to json|xml|binary|text]", "prints a property list in another form", runPlist},

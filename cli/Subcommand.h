@@ -45,6 +45,7 @@ int runRun(std::span<const std::string_view> arguments, Console& console);
 int runDeliveries(std::span<const std::string_view> arguments, Console& console);
 int runDefaults(std::span<const std::string_view> arguments, Console& console);
 int runNotify(std::span<const std::string_view> arguments, Console& console);
+int runDrivers(std::span<const std::string_view> arguments, Console& console);
 int runSettings(std::span<const std::string_view> arguments, Console& console);
 int runPlist(std::span<const std::string_view> arguments, Console& console);
 

@@ -33,9 +33,9 @@ symbols=$(nm -D --defined-only "$libraries/libvelareporting.so" | awk '{print $3
 [[ -n $symbols ]] || fail "the library shows nothing"
 strangers=$(grep -v '^VelaReporting[A-Za-z]*@@VELAREPORTING_0$' <<<"$symbols" || true)
 [[ -z $strangers ]] || fail "the library shows more than its functions: $strangers"
-declared=$(grep -oE 'VelaReporting[A-Za-z]+\(' "$here/include/vela/reporting.h" | tr -d '(' | sort -u)
+declared=$(grep -ohE 'VelaReporting[A-Za-z]+\(' "$here/include/vela/channels.h" "$here/include/vela/reporting.h" | tr -d '(' | sort -u)
 while IFS= read -r symbol; do
-    grep -qx "${symbol%%@@*}" <<<"$declared" || fail "$symbol is not declared in reporting.h"
+    grep -qx "${symbol%%@@*}" <<<"$declared" || fail "$symbol is not declared in a header"
 done <<<"$symbols"
 readelf -d "$libraries/libvelareporting.so" | grep -q 'SONAME.*\[libvelareporting\.so\.0\]' || fail "wrong SONAME"
 
@@ -45,6 +45,9 @@ read -ra flags <<<"$("$pkg_config" --cflags --libs velareporting)"
 "$cc" -std=c99 -Wall -Wextra -Wpedantic -Werror -o "$work/example_c" "$here/example.c" "${flags[@]}"
 "$cxx" -std=c++20 -Wall -Wextra -Wpedantic -Werror -o "$work/example_cpp" "$here/example.cpp" "${flags[@]}"
 run "$work/example_c"
+"$cc" -std=c99 -Wall -Wextra -Wpedantic -Werror -o "$work/channels_example" "$here/channels_example.c" "${flags[@]}"
+VELA_RUNTIME=$work LD_LIBRARY_PATH=$libraries "$work/channels_example" 1 >"$work/channels.log"
+[[ -n $(find "$work/hwstats" -name '*.channels') ]] || fail "channels_example published nothing"
 
 "$cmake" -S "$here/package_test" -B "$work/cmake" -DCMAKE_C_COMPILER="$cc" -DCMAKE_CXX_COMPILER="$cxx" \
     -DCMAKE_PREFIX_PATH="$(dirname -- "$libraries")" -DCMAKE_FIND_ROOT_PATH="$tree" >"$work/configure.log"

@@ -1,15 +1,14 @@
 // The C API over Client. No exception leaves it.
 #include "client/include/vela/reporting.h"
 
+#include "client/CallerStructs.h"
 #include "client/Client.h"
-#include "common/values/Utf8.h"
 #include "platform/dbus/Address.h"
 
 #include <algorithm>
 #include <array>
 #include <bit>
 #include <cstdlib>
-#include <cstring>
 #include <memory>
 #include <optional>
 #include <string>
@@ -19,6 +18,9 @@ using vela::client::CallQueue;
 using vela::client::Client;
 using vela::client::ClientSettings;
 using vela::client::ConfigurationArguments;
+using vela::client::copyIn;
+using vela::client::copyOut;
+using vela::client::copyText;
 using vela::client::MessageArguments;
 using vela::client::Operation;
 using vela::client::PlainCall;
@@ -44,30 +46,6 @@ constexpr std::array<const char*, 10> kStatusTexts = {
     "out of resources",
     "the reply is malformed",
 };
-
-/// Copies as much of a versioned struct as its user has, whose `size` stays.
-template <class Struct>
-void copyOut(const Struct& from, Struct* to) {
-    constexpr std::size_t kAfterSize = sizeof(std::size_t);
-    if (to->size > kAfterSize) {
-        const std::size_t bytes = std::min(to->size, sizeof(Struct)) - kAfterSize;
-        std::memcpy(reinterpret_cast<char*>(to) + kAfterSize, reinterpret_cast<const char*>(&from) + kAfterSize, bytes);
-    }
-}
-
-/// `text` with its NUL, cut between two characters.
-void copyText(const std::string& text, std::span<char> to) {
-    std::size_t bytes = 0;
-    while (bytes < text.size()) {
-        const vela::Utf8Step step = vela::utf8Step(std::string_view(text).substr(bytes));
-        if (bytes + step.bytes >= to.size()) {
-            break;
-        }
-        bytes += step.bytes;
-    }
-    std::memcpy(to.data(), text.data(), bytes);
-    to[bytes] = '\0';
-}
 
 VelaReportingStatus tell(const Reply& reply, VelaReportingError* error) {
     if (error != nullptr && reply.status != VelaReportingStatusOk) {
@@ -142,17 +120,9 @@ std::string_view variable(const char* name) {
 std::optional<ClientSettings> settingsOf(const VelaReportingClientOptions* options) {
     VelaReportingClientOptions known{};
     if (options != nullptr) {
-        if (options->size <= sizeof(options->size)) {
+        if (!copyIn(options, known)) {
             return std::nullopt;
         }
-        // Members that this library does not know must be at their defaults.
-        const auto* bytes = reinterpret_cast<const char*>(options);
-        for (std::size_t index = sizeof(known); index < options->size; ++index) {
-            if (bytes[index] != 0) {
-                return std::nullopt;
-            }
-        }
-        std::memcpy(&known, options, std::min(options->size, sizeof(known)));
     }
     ClientSettings settings;
     const std::string_view address = known.address != nullptr ? known.address : variable("VELA_REPORTING_ADDRESS");

@@ -57,6 +57,18 @@ struct Settings {
         std::vector<std::string> used; ///< shell patterns over event names
     } tally;
 
+    /// Sources of each group of driver statistics.
+    struct Drivers {
+        std::vector<std::string> tarn;
+        std::vector<std::string> speaker;
+        std::vector<std::string> mca;
+        std::vector<std::string> haptics;
+        std::vector<std::string> stateTransitionTimes;
+        std::vector<std::string> rx;
+        std::vector<std::string> tx;
+        std::vector<std::string> brook;
+    } drivers;
+
     /// Who may connect beside root and the service's own user.
     struct Access {
         std::vector<std::string> users;

@@ -55,7 +55,7 @@ SettingDescription list(const Name& name, std::vector<std::string> standard, std
     return {name.section, name.key, TextList, std::move(standard), 0, 0, std::move(choices), name.description, slot};
 }
 
-// The table is made in three parts only because of its length.
+// The table is made in parts only because of its length.
 
 std::vector<SettingDescription> placeSettings() {
     return {
@@ -87,7 +87,7 @@ std::vector<SettingDescription> deliverySettings() {
         size(Name{"store", "max_bytes", "Size of the store above which the oldest deliveries are dropped"}, "256 MiB",
              {kMiB, kTiB}, [](S& s) -> SettingSlot { return &s.store.maxBytes; }),
         number(Name{"store", "commit_messages",
-                    "Deliveries that are committed together at the most, and may be lost with the power"},
+                    "Deliveries whose waiting begins a commit, and that may be lost with the power"},
                Integer, 64, {1, 65536}, [](S& s) -> SettingSlot { return &s.store.commitMessages; }),
         number(Name{"store", "commit_ms", "Milliseconds after which a delivery is committed at the latest"},
                Milliseconds, 250, {1, 60000}, [](S& s) -> SettingSlot { return &s.store.commitDelay; }),
@@ -99,6 +99,34 @@ std::vector<SettingDescription> deliverySettings() {
              [](S& s) -> SettingSlot { return &s.access.users; }),
         list(Name{"access", "groups", "Groups whose members may connect"}, {"audio"}, {},
              [](S& s) -> SettingSlot { return &s.access.groups; }),
+    };
+}
+
+/// One setting for each group that the service asks for, by the group's own name.
+std::vector<SettingDescription> driverSettings() {
+    const auto group = [](std::string_view key, std::string_view description, std::vector<std::string> standard,
+                          Slot slot) {
+        return list(Name{"drivers", key, description}, std::move(standard),
+                    {"channels", "alsa-playback", "alsa-capture", "cpuidle", "devfreq", "runtime-pm", "force-feedback"},
+                    slot);
+    };
+    return {
+        group("Tarn", "Sources of the driver statistics of group Tarn: power and residency",
+              {"channels", "cpuidle", "devfreq", "runtime-pm"}, [](S& s) -> SettingSlot { return &s.drivers.tarn; }),
+        group("Speaker", "Sources of group Speaker: loudspeakers and amplifiers", {"channels"},
+              [](S& s) -> SettingSlot { return &s.drivers.speaker; }),
+        group("MCA", "Sources of subgroup MCA of any group: the mixing cycle", {"channels"},
+              [](S& s) -> SettingSlot { return &s.drivers.mca; }),
+        group("Haptics", "Sources of group Haptics, subgroup Stats: force feedback", {"channels", "force-feedback"},
+              [](S& s) -> SettingSlot { return &s.drivers.haptics; }),
+        group("StateTransitionTimes_ms", "Sources of group StateTransitionTimes_ms: how long changes of state take",
+              {"channels"}, [](S& s) -> SettingSlot { return &s.drivers.stateTransitionTimes; }),
+        group("Rx", "Sources of group Rx: what comes from the devices", {"channels", "alsa-capture"},
+              [](S& s) -> SettingSlot { return &s.drivers.rx; }),
+        group("Tx", "Sources of group Tx: what goes to the devices", {"channels", "alsa-playback"},
+              [](S& s) -> SettingSlot { return &s.drivers.tx; }),
+        group("Brook", "Sources of subgroup Brook of any group: wireless and network streams", {"channels"},
+              [](S& s) -> SettingSlot { return &s.drivers.brook; }),
     };
 }
 
@@ -125,7 +153,7 @@ std::vector<SettingDescription> limitSettings() {
 
 std::vector<SettingDescription> makeTable() {
     std::vector<SettingDescription> table = placeSettings();
-    for (const auto& more : {deliverySettings(), limitSettings()}) {
+    for (const auto& more : {deliverySettings(), driverSettings(), limitSettings()}) {
         table.insert(table.end(), more.begin(), more.end());
     }
     return table;

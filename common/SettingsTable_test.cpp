@@ -17,7 +17,7 @@ TEST(SettingsTableTest, EverySettingHasItsOwnNameAndPlace) {
         const void* place = std::visit([](auto* target) { return static_cast<const void*>(target); }, slot);
         EXPECT_TRUE(places.insert(place).second) << setting.name();
     }
-    EXPECT_EQ(names.size(), 22U);
+    EXPECT_EQ(names.size(), 30U);
 }
 
 TEST(SettingsTableTest, EveryDefaultIsAllowed) {

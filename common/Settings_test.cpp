@@ -57,6 +57,14 @@ TEST(SettingsTest, NothingGivenIsTheDefaults) {
     EXPECT_EQ(settings.store.commitDelay, std::chrono::milliseconds(250));
     EXPECT_EQ(settings.beacon.backends, List{"store"});
     EXPECT_EQ(settings.tally.used, List{"*"});
+    EXPECT_EQ(settings.drivers.tarn, (List{"channels", "cpuidle", "devfreq", "runtime-pm"}));
+    EXPECT_EQ(settings.drivers.speaker, List{"channels"});
+    EXPECT_EQ(settings.drivers.mca, List{"channels"});
+    EXPECT_EQ(settings.drivers.haptics, (List{"channels", "force-feedback"}));
+    EXPECT_EQ(settings.drivers.stateTransitionTimes, List{"channels"});
+    EXPECT_EQ(settings.drivers.rx, (List{"channels", "alsa-capture"}));
+    EXPECT_EQ(settings.drivers.tx, (List{"channels", "alsa-playback"}));
+    EXPECT_EQ(settings.drivers.brook, List{"channels"});
     EXPECT_EQ(settings.access.users, List{});
     EXPECT_EQ(settings.access.groups, List{"audio"});
     EXPECT_EQ(settings.limits.messageBytes, 1048576U);
@@ -85,6 +93,14 @@ TEST(SettingsTest, EverySettingCanBeSet) {
         fromFile("tally", "used", List{"a", "b"}),
         fromFile("access", "users", List{"u"}),
         fromFile("access", "groups", List{"g"}),
+        fromFile("drivers", "Tarn", List{"cpuidle"}),
+        fromFile("drivers", "Speaker", List{"alsa-playback"}),
+        fromFile("drivers", "MCA", List{"alsa-capture"}),
+        fromFile("drivers", "Haptics", List{"force-feedback"}),
+        fromFile("drivers", "StateTransitionTimes_ms", List{}),
+        fromFile("drivers", "Rx", List{"devfreq"}),
+        fromFile("drivers", "Tx", List{"runtime-pm"}),
+        fromFile("drivers", "Brook", List{"channels", "cpuidle"}),
         fromFile("limits", "message_bytes", "1 KiB"),
         fromFile("limits", "value_depth", std::int64_t{3}),
         fromFile("limits", "sessions_per_client", std::int64_t{4}),
@@ -110,6 +126,14 @@ TEST(SettingsTest, EverySettingCanBeSet) {
     EXPECT_EQ(settings.tally.used, (List{"a", "b"}));
     EXPECT_EQ(settings.access.users, List{"u"});
     EXPECT_EQ(settings.access.groups, List{"g"});
+    EXPECT_EQ(settings.drivers.tarn, List{"cpuidle"});
+    EXPECT_EQ(settings.drivers.speaker, List{"alsa-playback"});
+    EXPECT_EQ(settings.drivers.mca, List{"alsa-capture"});
+    EXPECT_EQ(settings.drivers.haptics, List{"force-feedback"});
+    EXPECT_EQ(settings.drivers.stateTransitionTimes, List{});
+    EXPECT_EQ(settings.drivers.rx, List{"devfreq"});
+    EXPECT_EQ(settings.drivers.tx, List{"runtime-pm"});
+    EXPECT_EQ(settings.drivers.brook, (List{"channels", "cpuidle"}));
     EXPECT_EQ(settings.limits.messageBytes, 1024U);
     EXPECT_EQ(settings.limits.valueDepth, 3U);
     EXPECT_EQ(settings.limits.sessionsPerClient, 4U);

@@ -37,11 +37,14 @@ folder=$(mktemp -d)
 trap 'rm -rf -- "$folder"' EXIT
 : >"$folder/one file.toml"
 
-offers _velactl "status sessions call run deliveries defaults notify settings plist --help --version" velactl ""
+offers _velactl "status sessions call run deliveries defaults notify drivers settings plist --help --version" velactl ""
 offers _velactl "sessions settings" velactl se
 offers _velactl "createReportingSession" velactl call cr
 offers _velactl "joule" velactl deliveries --backend j
 offers _velactl "--since" velactl deliveries --si
+offers _velactl "--settings --set --watch --count --json --help" velactl drivers ""
+offers _velactl "" velactl drivers --watch --count ""
+offers _velactl "log.level=" velactl drivers --set log.l
 offers _velactl "read write delete" velactl defaults ""
 offers _velactl "--json" velactl status --j
 offers _velactl "$folder/one file.toml" velactl run "$folder/o"
