@@ -6,7 +6,6 @@
 
 #include <cstdio>
 #include <cstdlib>
-#include <filesystem>
 
 namespace vela::ipcbench {
 
@@ -34,8 +33,8 @@ ServiceProcess::ServiceProcess(bool onDemand, std::vector<std::string> furtherSe
       furtherSettings_(std::move(furtherSettings)) {
     program_.emplace(commandLine(), std::vector<std::string>{"PATH=/usr/bin:/bin", "HOME=/nonexistent"});
     const bool there = testing::waitUntil([this] {
-        // On demand, a connection would start it before its time.
-        return onDemand_ ? std::filesystem::exists(socket())
+        // On demand, a connection would start it before its time, and the socket's file is there before it listens.
+        return onDemand_ ? program_->error().find("Listening on") != std::string::npos
                          : static_cast<bool>(dbus::connectTo({{socket(), false}}, true));
     });
     if (!there) {

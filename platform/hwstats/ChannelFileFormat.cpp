@@ -97,8 +97,9 @@ public:
     template <class Number>
     Number number() {
         Number number = 0;
-        const std::string_view bytes = take(sizeof(number));
-        std::memcpy(&number, bytes.data(), bytes.size());
+        if (const std::string_view bytes = take(sizeof(number)); !bytes.empty()) {
+            std::memcpy(&number, bytes.data(), bytes.size());
+        }
         return number;
     }
     std::optional<std::string> optionalText() {

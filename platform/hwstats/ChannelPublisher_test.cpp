@@ -107,6 +107,25 @@ TEST_F(ChannelPublisherTest, AValueBeyondTheBoundsCountsInTheNearestBucket) {
     EXPECT_EQ(words[4], 2U);
 }
 
+TEST_F(ChannelPublisherTest, EveryBucketOfAnyNumberOfThemIsFound) {
+    for (std::int64_t buckets = 1; buckets <= 9; ++buckets) {
+        ChannelTable table{"Driver", std::to_string(buckets), {}, {{HwStatsFormat::Histogram, "h", {}, {}, {}}}};
+        for (std::int64_t i = 0; i <= buckets; ++i) {
+            table.channels[0].bounds.push_back(10 * i);
+        }
+        const auto publisher = *ChannelPublisher::create(folder_.path(), "test", table);
+        for (std::int64_t i = 0; i < buckets; ++i) {
+            publisher->channels()[0].record(10 * i);
+            publisher->channels()[0].record(10 * i + 9);
+        }
+        const FileDescriptor descriptor(open(publisher->path().c_str(), O_RDONLY));
+        FileBytes file(descriptor.get());
+        const auto values = readChannelValues(file, headerOf(publisher->path()), table, 0);
+        EXPECT_EQ(std::vector(values->words.begin() + 2, values->words.end()),
+                  std::vector<std::uint64_t>(static_cast<std::size_t>(buckets), 2));
+    }
+}
+
 TEST_F(ChannelPublisherTest, TheFirstValueIsLeastAndGreatest) {
     const auto publisher = publish();
     publisher->channels()[1].record(7);
@@ -217,7 +236,9 @@ void inKilledProcess(Work work) {
     const pid_t child = fork();
     if (child == 0) {
         work();
-        static_cast<void>(write(ready[1], "x", 1));
+        if (write(ready[1], "x", 1) != 1) {
+            _exit(1);
+        }
         for (;;) {
             pause();
         }
