@@ -198,7 +198,8 @@ TEST(ServiceLifeTest, TheFirstConnectionStartsTheServiceOnDemand) {
         GTEST_SKIP() << "systemd-socket-activate is not installed";
     }
     testing::RunningProgram activator(words, RunningService::environment());
-    ASSERT_TRUE(testing::waitUntil([&] { return std::filesystem::exists(socket); }));
+    // The socket's file is there a moment before it listens.
+    ASSERT_TRUE(testing::waitUntil([&] { return activator.error().find("Listening on") != std::string::npos; }));
     EXPECT_EQ(ServiceClient(socket).call("createReportingSession", "[42]"), "true");
     EXPECT_EQ(ServiceClient(socket).call("getAllReporters"), "[]");
     EXPECT_THAT(activator.error(), HasSubstr("serving at the socket of the service manager"));
