@@ -125,15 +125,15 @@ void AlsaSource::sample(SystemReading& system, Samples& samples) {
 }
 
 void AlsaSource::sampleCard(SystemReading& system, const std::string& card, Samples& samples) {
-    const std::string folder = std::string(kFolder) + "/" + card;
+    const std::string folder = below(kFolder, card);
     BlockBuilder block(std::string(playback_ ? "alsa-playback:" : "alsa-capture:") + card,
                        system.read(folder + "/id").value_or(card));
     for (const std::string& pcm : system.list(folder, "pcm")) {
         if (!pcm.ends_with(playback_ ? 'p' : 'c')) {
             continue;
         }
-        for (const std::string& sub : system.list(folder + "/" + pcm, "sub")) {
-            const std::string path = folder + "/" + pcm + "/" + sub;
+        for (const std::string& sub : system.list(below(folder, pcm), "sub")) {
+            const std::string path = below(below(folder, pcm), sub);
             const std::optional<std::string> text = system.read(path + "/status");
             const std::optional<AlsaStatus> status = text ? readAlsaStatus(*text) : std::nullopt;
             if (!status) {
@@ -146,7 +146,8 @@ void AlsaSource::sampleCard(SystemReading& system, const std::string& card, Samp
                 stream->second.states[i].name = kAlsaStates[i];
             }
             observe(stream->second, *status, rate, samples.time);
-            const std::string name = pcm + " " + sub;
+            std::string name = pcm;
+            name.append(" ").append(sub);
             block.simple(name + " frames", "frames", stream->second.frames);
             block.simple(name + " milliseconds", "ms", stream->second.nanoseconds / kNanosecondsPerMillisecond);
             block.state(name + " state", {stream->second.states.begin(), stream->second.states.end()});

@@ -48,7 +48,7 @@ public:
     /// Gives the file `temporary` the first name that no living publisher has; empty with errno set when there is none.
     std::string take(const std::string& temporary) {
         for (int number = 1; number <= kMostNumbers; ++number) {
-            const std::string name =
+            std::string name =
                 stem_ + (number == 1 ? "" : "~" + std::to_string(number)) + std::string(kChannelFileSuffix);
             if (linkat(folder_.get(), temporary.c_str(), folder_.get(), name.c_str(), 0) == 0) {
                 unlinkat(folder_.get(), temporary.c_str(), 0);

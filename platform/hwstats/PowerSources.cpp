@@ -77,10 +77,10 @@ void CpuIdleSource::sample(SystemReading& system, Samples& samples) {
     BlockBuilder block("cpuidle:", "cpuidle");
     block.countsSinceStart();
     for (const std::string& cpu : system.list(folder, "cpu")) {
-        const std::string states = folder + "/" + cpu + "/cpuidle";
+        const std::string states = below(below(folder, cpu), "cpuidle");
         std::vector<BlockBuilder::State> residencies;
         for (const std::string& state : system.list(states, "state")) {
-            const std::string path = states + "/" + state;
+            const std::string path = below(states, state);
             const std::optional<std::string> name = system.read(path + "/name");
             const std::optional<std::uint64_t> usage = system.number(path + "/usage");
             const std::optional<std::uint64_t> microseconds = system.number(path + "/time");
@@ -120,7 +120,7 @@ void DevFreqSource::sample(SystemReading& system, Samples& samples) {
     const std::string folder = "/sys/class/devfreq";
     BlockBuilder block("devfreq:", "devfreq");
     for (const std::string& device : system.list(folder)) {
-        const std::optional<std::string> text = system.read(folder + "/" + device + "/trans_stat");
+        const std::optional<std::string> text = system.read(below(below(folder, device), "trans_stat"));
         const std::vector<BlockBuilder::State> states = readTransStat(text.value_or(""));
         if (!states.empty()) {
             block.state(device, states);
@@ -141,7 +141,7 @@ void RuntimePmSource::findDevices(SystemReading& system, std::uint64_t now) {
         const std::string folder = folders[i];
         for (const std::string& name : system.folders(kDevices + folder)) {
             if (name != "power") {
-                folders.push_back(folder + "/" + name);
+                folders.push_back(below(folder, name));
                 continue;
             }
             const std::optional<std::string> status = system.read(kDevices + folder + "/power/runtime_status");

@@ -53,6 +53,13 @@ private:
     bool spent_ = false;
 };
 
+/// "folder/name".
+inline std::string below(std::string_view folder, std::string_view name) {
+    std::string path(folder);
+    path.append("/").append(name);
+    return path;
+}
+
 /// The number that is the whole of `text`.
 std::optional<std::uint64_t> numberOf(std::string_view text);
 
