@@ -16,7 +16,7 @@ public:
 
     virtual void performanceTraceDidStart(const std::optional<Failure>& error) = 0;
     virtual void performanceTraceDidStop(const std::optional<Failure>& error) = 0;
-    /// The end: the result's file URL, and a token that nobody reads yet.
+    /// The end, also of a trace that did not start: the result's file URL, and a token that nobody reads yet.
     virtual void performanceTraceDidComplete(const std::string& url, const std::string& token,
                                              const std::optional<Failure>& error) = 0;
 };

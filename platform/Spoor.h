@@ -21,7 +21,9 @@ struct SpoorEvent {
     std::int32_t wallTimeMicroseconds = 0;
 };
 
-/// Confined to its owner's queue but for what says otherwise. Destroying it ends it without a completion.
+/// Used by one thread at a time but for what says otherwise. Every session that was ended completes exactly once, also
+/// after a failed start, and may be destroyed inside its own completion handler. Destroying it before that ends it
+/// without a completion.
 class SpoorSession {
 public:
     virtual ~SpoorSession() = default;
@@ -36,6 +38,8 @@ public:
     virtual int start(SerialQueue& queue) = 0;
     /// Ends the collection: what was emitted before is delivered, then the completion handler is called.
     virtual int end() = 0;
+    /// Events that were emitted and could not be delivered. For the completion handler: it is final then.
+    virtual std::uint64_t lostEvents() const = 0;
     /// Any thread.
     virtual std::uint64_t nanoseconds(std::uint64_t timestamp) const = 0;
 };

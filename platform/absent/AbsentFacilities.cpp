@@ -56,6 +56,7 @@ public:
         return 0;
     }
     std::uint64_t nanoseconds(std::uint64_t timestamp) const override { return timestamp; }
+    std::uint64_t lostEvents() const override { return 0; }
 
 private:
     SerialQueue* queue_ = nullptr; ///< where the start was tried
