@@ -35,6 +35,13 @@ if(VELA_HARDENING)
     $<$<STREQUAL:$<TARGET_PROPERTY:TYPE>,EXECUTABLE>:-pie>)
 endif()
 
+# vela_compile_alone(file...)
+# For a room's sources whose own names (a helper, a constant) another source of the room has as well: presets that
+# compile several sources together leave them out. The debug preset compiles every source by itself.
+function(vela_compile_alone)
+  set_source_files_properties(${ARGN} PROPERTIES SKIP_UNITY_BUILD_INCLUSION ON)
+endfunction()
+
 # vela_library(NAME SOURCES file... [HEADERS file...] [LINKS target...] [PRIVATE_LINKS target...])
 # One room or one binding. Without sources it is an interface library of headers.
 function(vela_library name)
@@ -64,13 +71,9 @@ function(vela_test name)
   add_executable(${name} ${arg_SOURCES})
   target_link_libraries(${name} PRIVATE vela_options ${arg_LINKS} GTest::gmock GTest::gtest_main)
   # What is tested is built as its preset says; the tests themselves, two thirds of all compile time, need no speed.
-  if(VELA_SANITIZE)
-    target_compile_options(${name} PRIVATE -O0)
-  else()
-    target_compile_options(${name} PRIVATE $<$<NOT:$<CONFIG:Debug>>:-O1>)
-    if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU") # takes the standard library's own checks of streams for proofs
-      target_compile_options(${name} PRIVATE -Wno-error=null-dereference)
-    endif()
+  target_compile_options(${name} PRIVATE -O0 -g1)
+  if(VELA_HARDENING)
+    target_compile_options(${name} PRIVATE -U_FORTIFY_SOURCE) # wants optimisation
   endif()
   # A debug build pays for its checks; the time limit only ends what hangs.
   include(GoogleTest)
@@ -104,4 +107,5 @@ function(vela_benchmark name)
   cmake_parse_arguments(PARSE_ARGV 1 arg "" "" "SOURCES;LINKS")
   add_executable(${name} ${arg_SOURCES})
   target_link_libraries(${name} PRIVATE vela_options ${arg_LINKS} benchmark::benchmark)
+  set_target_properties(${name} PROPERTIES UNITY_BUILD OFF)
 endfunction()
