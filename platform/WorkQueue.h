@@ -91,7 +91,7 @@ class WorkQueues {
 public:
     virtual ~WorkQueues() = default;
 
-    /// A new serial queue. `name` shows in the thread's name while an item of it runs.
+    /// A new serial queue. `name` shows in the thread's name while an item of it blocks, or many follow each other.
     virtual std::unique_ptr<SerialQueue> makeSerialQueue(std::string_view name, QualityOfService quality) = 0;
 
     /// The shared background queue: its items run in any order and beside each other.
@@ -102,8 +102,9 @@ public:
 
     virtual std::unique_ptr<Condition> makeCondition() = 0;
 
-    /// Brackets a stretch in which the running item blocks for long: the pool runs other work on a further thread
-    /// meanwhile. Calls nest. Outside an item both do nothing.
+    /// Brackets a stretch in which the running item blocks or computes for long: the pool runs other work on a further
+    /// thread meanwhile. Without it, what the item posted may wait for the item's end. Calls nest. Outside an item both
+    /// do nothing.
     virtual void beginBlocking() = 0;
     virtual void endBlocking() = 0;
 };

@@ -97,7 +97,9 @@ bool SerialQueueCore::runTurn() {
         WorkItem item;
         switch (takeNext(item)) {
         case Next::Item:
+            pool().beginItem();
             item(); // and its captures go at the end of this round, before the next item begins
+            pool().endItem();
             break;
         case Next::TurnOver:
             return false;

@@ -18,25 +18,101 @@ namespace {
 using namespace std::chrono_literals;
 using vela::testing::Record;
 
-std::string threadName() {
+std::string currentThreadName() {
     std::string name;
     std::getline(std::ifstream("/proc/thread-self/comm"), name);
     return name;
 }
 
-TEST(LinuxWorkQueuesQualityTest, AThreadBearsTheNameOfTheQueueThatItServes) {
+TEST(LinuxWorkQueuesQualityTest, AThreadThatBlocksBearsTheNameOfTheQueueThatItServes) {
     std::promise<std::string> inSession;
     std::promise<std::string> inTracing;
     std::promise<std::string> inBackground;
     LinuxWorkQueues queues(1);
     const auto session = queues.makeSerialQueue("com.orvex.vela.session.beaconreporting", QualityOfService::Utility);
     const auto tracing = queues.makeSerialQueue("Tracing Queue", QualityOfService::Default);
-    session->post([&inSession] { inSession.set_value(threadName()); });
+    const auto threadName = [&queues] {
+        const BlockingScope blocking(queues);
+        return currentThreadName();
+    };
+    session->post([&] { inSession.set_value(threadName()); });
     EXPECT_EQ(inSession.get_future().get(), "beaconreporting");
-    tracing->post([&inTracing] { inTracing.set_value(threadName()); });
+    tracing->post([&] { inTracing.set_value(threadName()); });
     EXPECT_EQ(inTracing.get_future().get(), "Tracing Queue");
-    queues.background().post([&inBackground] { inBackground.set_value(threadName()); });
+    queues.background().post([&] { inBackground.set_value(threadName()); });
     EXPECT_EQ(inBackground.get_future().get(), "vela.background");
+}
+
+TEST(LinuxWorkQueuesQualityTest, AThreadThatRunsManyItemsInARowBearsTheNameOfTheirQueue) {
+    std::promise<std::string> name;
+    Gate gate;
+    LinuxWorkQueues queues(1);
+    const auto busy = queues.makeSerialQueue("com.orvex.vela.busy", QualityOfService::Utility);
+    busy->post(gate.item());
+    ASSERT_TRUE(gate.isReachedBy(1));
+    for (int i = 0; i < 100; ++i) {
+        busy->post([] {});
+    }
+    busy->post([&name] { name.set_value(currentThreadName()); });
+    gate.open();
+    EXPECT_EQ(name.get_future().get(), "orvex.vela.busy");
+}
+
+// With threads to spare, so that only the order of the wake-ups could let it run beside.
+TEST(LinuxWorkQueuesQualityTest, WhatAnItemPostsElsewhereRunsWhenTheItemBlocks) {
+    std::promise<void> ran;
+    std::promise<bool> seen;
+    LinuxWorkQueues queues(4);
+    const auto one = queues.makeSerialQueue("one", QualityOfService::Default);
+    const auto other = queues.makeSerialQueue("other", QualityOfService::Default);
+    one->post([&] {
+        other->post([&ran] { ran.set_value(); });
+        const BlockingScope blocking(queues);
+        seen.set_value(ran.get_future().wait_for(60s) == std::future_status::ready);
+    });
+    EXPECT_TRUE(seen.get_future().get());
+}
+
+TEST(LinuxWorkQueuesQualityTest, WhatABlockedItemPostsElsewhereRunsBesideIt) {
+    std::promise<void> ran;
+    std::promise<bool> seen;
+    LinuxWorkQueues queues(4);
+    const auto one = queues.makeSerialQueue("one", QualityOfService::Default);
+    const auto other = queues.makeSerialQueue("other", QualityOfService::Default);
+    one->post([&] {
+        const BlockingScope blocking(queues);
+        other->post([&ran] { ran.set_value(); });
+        seen.set_value(ran.get_future().wait_for(60s) == std::future_status::ready);
+    });
+    EXPECT_TRUE(seen.get_future().get());
+}
+
+TEST(LinuxWorkQueuesQualityTest, WhatAnItemPostsToAMoreUrgentQueueRunsBesideIt) {
+    std::promise<void> ran;
+    std::promise<bool> seen;
+    LinuxWorkQueues queues(4);
+    const auto one = queues.makeSerialQueue("one", QualityOfService::Utility);
+    const auto urgent = queues.makeSerialQueue("urgent", QualityOfService::Default);
+    one->post([&] {
+        urgent->post([&ran] { ran.set_value(); });
+        seen.set_value(ran.get_future().wait_for(60s) == std::future_status::ready);
+    });
+    EXPECT_TRUE(seen.get_future().get());
+}
+
+// The first item hands work to another queue; the second waits for it.
+TEST(LinuxWorkQueuesQualityTest, WhatAnItemPostsElsewhereRunsBesideTheNextItemOfItsQueue) {
+    std::promise<void> ran;
+    std::promise<bool> seen;
+    Gate gate;
+    LinuxWorkQueues queues(4);
+    const auto one = queues.makeSerialQueue("one", QualityOfService::Default);
+    const auto other = queues.makeSerialQueue("other", QualityOfService::Default);
+    one->post(gate.item());
+    one->post([&] { other->post([&ran] { ran.set_value(); }); });
+    one->post([&] { seen.set_value(ran.get_future().wait_for(60s) == std::future_status::ready); });
+    gate.open();
+    EXPECT_TRUE(seen.get_future().get());
 }
 
 TEST(LinuxWorkQueuesQualityTest, ATimerIsServedBesideAQueueThatNeverEnds) {

@@ -14,7 +14,10 @@ namespace {
 constexpr int kNicest = 19;
 
 /// Answers whether the system allowed it.
-bool setThreadNice(int nice) { return setpriority(PRIO_PROCESS, static_cast<id_t>(gettid()), nice) == 0; }
+bool setThreadNice(int nice) {
+    constexpr id_t kCallingThread = 0; // in Linux; not its process
+    return setpriority(PRIO_PROCESS, kCallingThread, nice) == 0;
+}
 
 } // namespace
 
@@ -34,7 +37,7 @@ ThreadName threadNameFor(std::string_view queueName) {
     return name;
 }
 
-int threadNice() { return getpriority(PRIO_PROCESS, static_cast<id_t>(gettid())); }
+int threadNice() { return getpriority(PRIO_PROCESS, 0); }
 
 int niceFor(QualityOfService quality, int base) {
     constexpr std::array<int, 4> kNicer = {0, 1, 5, 10};

@@ -21,6 +21,8 @@ struct Worker {
     WorkerPool* pool = nullptr;
     const QueueCore* queue = nullptr; // being served
     unsigned blockingDepth = 0;
+    bool inItem = false;   // of a serial queue
+    bool owesWake = false; // the item made a queue ready that this thread serves next, or else wakes another for
     ThreadAppearance appearance;
 };
 

@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <cassert>
-#include <sched.h>
 #include <system_error>
 #include <utility>
 
@@ -15,30 +14,10 @@ namespace {
 
 using namespace std::chrono_literals;
 
-/// How long a thread that ran out of work goes on looking for more. Somewhat longer than a sleeping thread takes to
-/// wake, so that work which comes in quick succession pays for no wake-up.
-constexpr Nanoseconds kLookFor = 10us;
-
 /// How long a thread that stood in for a blocked one is kept for the next time.
 constexpr Nanoseconds kKeepSurplus = 2s;
 
 constinit thread_local Worker* currentWorker = nullptr;
-
-unsigned usableProcessors() {
-    cpu_set_t set;
-    if (sched_getaffinity(0, sizeof set, &set) != 0) {
-        return 1;
-    }
-    return static_cast<unsigned>(CPU_COUNT(&set));
-}
-
-void relaxProcessor() {
-#if defined(__x86_64__) || defined(__i386__)
-    __builtin_ia32_pause();
-#elif defined(__aarch64__) || defined(__arm__)
-    asm volatile("yield" ::: "memory");
-#endif
-}
 
 } // namespace
 
@@ -49,7 +28,6 @@ MonotonicTime deadlineAfter(Nanoseconds timeout) {
 
 WorkerPool::WorkerPool(unsigned limit)
     : limit_(limit),
-      maySpin_(usableProcessors() > 1),
       appliesPriorities_(niceCanBeTakenBack()),
       baseNice_(threadNice()) {
     assert(limit > 0);
@@ -80,10 +58,35 @@ void WorkerPool::stop() {
 
 void WorkerPool::makeReady(PoolLock& lock, std::shared_ptr<QueueCore> queue) {
     const QualityOfService quality = queue->quality();
+    const bool next = servesNext(*queue);
     ready_.push(quality, std::move(queue));
     noteReady();
-    wakeForWork(lock);
+    if (next) {
+        currentWorker->owesWake = true;
+    } else {
+        wakeForWork(lock);
+    }
 }
+
+/// Whether the calling thread may serve `queue` itself after the item that it runs.
+bool WorkerPool::servesNext(const QueueCore& queue) const {
+    const Worker* const self = currentWorker;
+    return self != nullptr && self->pool == this && self->inItem && self->blockingDepth == 0 &&
+           queue.quality() >= self->queue->quality();
+}
+
+void WorkerPool::beginItem() {
+    Worker& self = *currentWorker;
+    self.inItem = true;
+    if (std::exchange(self.owesWake, false)) { // this thread goes on with its own queue first
+        PoolLock lock(*this);
+        if (!ready_.empty()) {
+            wakeForWork(lock);
+        }
+    }
+}
+
+void WorkerPool::endItem() { currentWorker->inItem = false; }
 
 TimerKey WorkerPool::addTimer(PoolLock& lock, MonotonicTime deadline, TimerClient& client) {
     const TimerKey key{deadline, nextTimer_++};
@@ -102,6 +105,9 @@ void WorkerPool::beginBlocking(PoolLock& lock) {
     Worker* const self = currentWorker;
     if (self == nullptr || self->pool != this || self->blockingDepth++ > 0) {
         return;
+    }
+    if (self->queue != nullptr) {
+        self->appearance.adopt(self->queue->threadName());
     }
     --active_;
     ++blocked_;
@@ -146,18 +152,15 @@ void WorkerPool::run(Worker& self) {
     self.pool = this;
     self.appearance = ThreadAppearance(threadNameFor("vela.worker"), baseNice_);
     PoolLock lock(*this);
-    bool mayLook = false;
     for (;;) {
         fireDueTimers(lock);
         if (serveNext(lock, self)) {
-            mayLook = true;
             continue;
         }
         if (stopping_) {
             break;
         }
-        const bool look = std::exchange(mayLook, false);
-        if ((look && lookAround(lock)) || takeOffBackgroundPriority(lock, self)) {
+        if (takeOffBackgroundPriority(lock, self)) {
             continue;
         }
         if (!rest(lock, self)) {
@@ -191,7 +194,10 @@ bool WorkerPool::serveNext(PoolLock& lock, Worker& self) {
     const bool again = queue->runTurn();
     assert(self.blockingDepth == 0);
     self.queue = nullptr;
-    if (!again) {
+    self.owesWake = false; // what is ready is looked at next
+    if (again) {
+        self.appearance.adopt(queue->threadName());
+    } else {
         queue.reset();
     }
     lock.relock();
@@ -200,26 +206,6 @@ bool WorkerPool::serveNext(PoolLock& lock, Worker& self) {
         ready_.push(quality, std::move(queue)); // this thread looks at it next, nobody needs waking
         noteReady();
     }
-    return true;
-}
-
-/// Looks for work for a short while before resting. One thread at a time does.
-bool WorkerPool::lookAround(PoolLock& lock) {
-    if (!maySpin_ || looking_ > 0 || active_ > limit_) {
-        return false;
-    }
-    ++looking_;
-    lock.unlock();
-    const MonotonicTime until = std::chrono::steady_clock::now() + kLookFor;
-    bool found = false;
-    do {
-        for (int i = 0; i < 8 && !found; ++i) {
-            relaxProcessor();
-            found = readyMask_.load(std::memory_order_relaxed) != 0;
-        }
-    } while (!found && std::chrono::steady_clock::now() < until);
-    lock.relock();
-    --looking_;
     return true;
 }
 
@@ -270,7 +256,6 @@ bool WorkerPool::takeOffBackgroundPriority(PoolLock& lock, Worker& self) {
 }
 
 void WorkerPool::prepare(Worker& self, const QueueCore& queue) const {
-    self.appearance.adopt(queue.threadName());
     if (appliesPriorities_) {
         self.appearance.adopt(niceFor(queue.quality(), baseNice_));
     }

@@ -60,7 +60,9 @@ public:
     /// Ends the threads when what is ready has been served, and joins them. Not from one of them.
     void stop();
 
-    /// Puts `queue`, which must not be ready already, behind the others of its urgency.
+    /// Puts `queue`, which must not be ready already, behind the others of its urgency, and sees to it that a thread
+    /// serves it. From inside an item (see `beginItem`) of a queue that is at least as urgent, that is the calling
+    /// thread, when the item has ended: work that is handed from queue to queue in small steps wakes nobody.
     void makeReady(PoolLock& lock, std::shared_ptr<QueueCore> queue);
 
     /// `client` must live until its timer has fired or was removed.
@@ -71,6 +73,11 @@ public:
     /// `endBlocking`.
     void beginBlocking(PoolLock& lock);
     void endBlocking(PoolLock& lock);
+
+    /// Around an item of the serial queue that the calling thread serves; never around one that may run for long
+    /// without saying that it blocks.
+    void beginItem();
+    void endItem();
 
     /// Waits until `ended` answers true, which is asked whenever `turnEnded` was called.
     template <class Predicate>
@@ -105,7 +112,7 @@ private:
 
     void run(Worker& self);
     bool serveNext(PoolLock& lock, Worker& self);
-    bool lookAround(PoolLock& lock);
+    bool servesNext(const QueueCore& queue) const;
     bool rest(PoolLock& lock, Worker& self);
     bool takeOffBackgroundPriority(PoolLock& lock, Worker& self);
     void prepare(Worker& self, const QueueCore& queue) const;
@@ -118,7 +125,6 @@ private:
     void noteReady() { readyMask_.store(ready_.mask(), std::memory_order_relaxed); }
 
     const unsigned limit_;
-    const bool maySpin_;
     const bool appliesPriorities_;
     const int baseNice_;
 
@@ -134,7 +140,7 @@ private:
     std::size_t total_ = 0;
     std::size_t blocked_ = 0;
     std::size_t active_ = 0;
-    unsigned looking_ = 0; // active threads without a queue that will find whatever becomes ready
+    unsigned looking_ = 0; // active threads that look at the timers and serve what becomes ready by them
     bool stopping_ = false;
     std::optional<MonotonicTime> surplusSince_;
     std::condition_variable turnEnded_;
