@@ -1,5 +1,6 @@
 #include "platform/hwstats/LinuxHwStats.h"
 
+#include "common/VelaReportingLogCategories.h"
 #include "platform/hwstats/ChannelFileNames.h"
 
 #include <algorithm>
@@ -56,7 +57,8 @@ LinuxHwStatsOptions hwStatsOptionsOf(const Settings& settings) {
 LinuxHwStats::LinuxHwStats(LinuxHwStatsOptions options, const Clock& clock)
     : clock_(clock),
       folder_(std::move(options.channelFolder)),
-      systemRoot_(std::move(options.systemRoot)) {
+      systemWait_(options.systemWait),
+      sampler_(std::move(options.systemRoot), clock) {
     const MutexLock lock(mutex_);
     for (const HwStatsGroup& group : options.groups) {
         Group& made = groups_.emplace_back();
@@ -121,12 +123,17 @@ HwStatsAnswer<HwStatsSamples> LinuxHwStats::createSamples(const HwStatsSubscript
     std::optional<HwStatsError> error;
     const MutexLock lock(mutex_);
     samples->time = static_cast<std::uint64_t>(clock_.monotonicNow().time_since_epoch().count());
-    hwstats::SystemReading system(systemRoot_, clock_);
     const std::vector<const Group*> groups = groupsFor(wanted);
+    std::vector<hwstats::SystemSource*> sources;
     for (const Group* group : groups) {
         for (std::size_t i = 0; group->givesSources(wanted) && i < group->sources.size(); ++i) {
-            group->sources[i]->sample(system, *samples);
+            sources.push_back(group->sources[i].get());
         }
+    }
+    if (!sources.empty() && !sampler_.sample(sources, *samples, systemWait_)) {
+        VelaReportingDriverUtilityCategory().error(
+            "the system's numbers for driver %@-%@ were not read within %lli ms: left out of this sampling",
+            wanted.group, wanted.subGroup, systemWait_.count());
     }
     if (std::ranges::any_of(groups, [&](const Group* group) { return group->mayGiveFiles(wanted); })) {
         const auto isWanted = [&](const ChannelTable& table) {

@@ -2,9 +2,8 @@
 // kernel. The settings say which source feeds which group. A group with a source has channels from the start, one for
 // each source that stands for all that the source will have: who is there is looked up at each sampling.
 //
-// Thread-safe: one sampling at a time. Samplings read a bounded number of files within a bounded time, apart from what
-// the kernel takes to make the content of a single file of /proc or /sys (see SystemReading). Its objects may outlive
-// it.
+// Thread-safe: one sampling at a time. Samplings read a bounded number of files within a bounded time: numbers of the
+// kernel that take longer are left out, and logged. Its objects may outlive it.
 #pragma once
 
 #include "platform/Clock.h"
@@ -12,9 +11,11 @@
 #include "platform/Mutex.h"
 #include "platform/hwstats/ChannelFolder.h"
 #include "platform/hwstats/HwStatsGroups.h"
+#include "platform/hwstats/SystemSampler.h"
 #include "platform/hwstats/SystemSource.h"
 
 #include <cerrno>
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -28,6 +29,7 @@ struct LinuxHwStatsOptions {
     std::string channelFolder;        ///< of the channel files; may not be there yet
     std::string systemRoot;           ///< where /proc and /sys stand: "" for this machine's own
     std::vector<HwStatsGroup> groups; ///< every group that may be asked for
+    std::chrono::milliseconds systemWait = hwstats::SystemSampler::kMostWait; ///< the longest wait for /proc and /sys
 };
 
 /// Those of a service with these settings.
@@ -69,9 +71,10 @@ private:
     const Clock& clock_;
     Mutex mutex_;
     hwstats::ChannelFolder folder_ VELA_GUARDED_BY(mutex_);
-    const std::string systemRoot_;
-    /// The groups stay; their sources are used under the lock.
+    /// The groups stay; their sources are used by the sampler alone.
     std::vector<Group> groups_ VELA_GUARDED_BY(mutex_);
+    const std::chrono::milliseconds systemWait_;
+    hwstats::SystemSampler sampler_; // destroyed before the sources
 };
 
 } // namespace vela::platform

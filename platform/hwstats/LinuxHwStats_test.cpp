@@ -138,7 +138,8 @@ protected:
                             {{"Speaker", {}}, kChannelFiles},
                             {{{}, "MCA"}, {HwStatsSource::Channels, HwStatsSource::AlsaPlayback}},
                             {{"Haptics", "Stats"}, {HwStatsSource::ForceFeedback}},
-                            {{"Rx", {}}, {}}}},
+                            {{"Rx", {}}, {}}},
+                           std::chrono::minutes(5)},
                           clock_};
     std::optional<HwStatsError> error_;
 };

@@ -1,7 +1,7 @@
 // Reads the small files in which the kernel says its numbers, below a root folder, within a budget of files and time:
 // what a sampling has spent, later readings of it do not get. The kernel makes the content while it is read, and may
-// wait for a driver meanwhile (a PCM that is just being opened, a governor that is just at work); nothing that a reader
-// can ask for prevents that, so the budget's time is looked at between the files. Confined to one sampling.
+// wait for a driver meanwhile: the budget's time is looked at between the files, and SystemSampler waits no longer than
+// it may. Confined to one sampling.
 #pragma once
 
 #include "platform/Clock.h"
