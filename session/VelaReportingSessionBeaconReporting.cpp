@@ -6,6 +6,7 @@
 #include "session/SessionTraceCode.h"
 #include "session/VelaReportingSession.h"
 
+#include <cerrno>
 #include <chrono>
 #include <random>
 #include <utility>
@@ -63,7 +64,7 @@ void sendSingleMessageNow(const VelaReportingSessionPlatform& sessionPlatform, c
 // What Beacon took is counted by Beacon.
 void endDelivery(LedgerItem& item, const std::optional<platform::Failure>& error) {
     if (error) {
-        item.drop(DropReason::Failed);
+        item.drop(error->code == ENOBUFS ? DropReason::QueueFull : DropReason::Failed);
     } else {
         item.handOver();
     }

@@ -1,6 +1,8 @@
 // What the session counts of its messages to real-time reporting.
 #include "session/Session_test.h"
 
+#include <cerrno>
+
 namespace vela {
 
 namespace {
@@ -38,6 +40,15 @@ TEST_F(VelaReportingSessionLedgerTest, AMessageThatBeaconDoesNotTakeFailed) {
     send({{"a", 1}});
     queues_.runUntilIdle();
     EXPECT_EQ(dropped(DropReason::Failed), 1U);
+}
+
+TEST_F(VelaReportingSessionLedgerTest, AMessageThatMeetsAFullQueueOfBeaconIsCountedAsThat) {
+    runningSession();
+    beacon_.failSends("the queue is full", ENOBUFS);
+    send({{"a", 1}});
+    queues_.runUntilIdle();
+    EXPECT_EQ(dropped(DropReason::QueueFull), 1U);
+    EXPECT_EQ(dropped(DropReason::Failed), 0U);
 }
 
 TEST_F(VelaReportingSessionLedgerTest, WithoutBackEndsMessagesAreDropped) {

@@ -32,7 +32,7 @@ public:
     platform::Result<platform::Done> outcomeOfSend() VELA_EXCLUDES(mutex_) {
         const MutexLock lock(mutex_);
         if (failure_) {
-            return platform::Failure{0, *failure_};
+            return *failure_;
         }
         return platform::Done();
     }
@@ -61,7 +61,7 @@ public:
     std::map<std::uint32_t, Discovery> discoveriesOf_ VELA_GUARDED_BY(mutex_);
     Discovery discovery_ VELA_GUARDED_BY(mutex_) = Discovery::Waits;
     Array backends_ VELA_GUARDED_BY(mutex_) = {"store"};
-    std::optional<std::string> failure_ VELA_GUARDED_BY(mutex_);
+    std::optional<platform::Failure> failure_ VELA_GUARDED_BY(mutex_);
     std::string description_ VELA_GUARDED_BY(mutex_) = "FakeBeaconSession";
     std::function<void(Operation)> observer_ VELA_GUARDED_BY(mutex_);
     std::int64_t tokens_ VELA_GUARDED_BY(mutex_) = 0;
@@ -125,9 +125,9 @@ void FakeBeacon::setBackends(Array backends) {
     state_->backends_ = std::move(backends);
 }
 
-void FakeBeacon::failSends(std::optional<std::string> description) {
+void FakeBeacon::failSends(std::optional<std::string> description, int code) {
     const MutexLock lock(state_->mutex_);
-    state_->failure_ = std::move(description);
+    state_->failure_ = description ? std::optional(platform::Failure{code, *std::move(description)}) : std::nullopt;
 }
 
 void FakeBeacon::setDescription(std::string description) {

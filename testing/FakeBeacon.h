@@ -54,7 +54,7 @@ public:
     /// What is found: "store" unless a test says otherwise.
     void setBackends(Array backends);
     /// Sends fail with this description, or work again with none.
-    void failSends(std::optional<std::string> description);
+    void failSends(std::optional<std::string> description, int code = 0);
     /// Of all sessions: "FakeBeaconSession" at first.
     void setDescription(std::string description);
     /// Called at the start of every call, outside the lock.
