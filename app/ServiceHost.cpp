@@ -1,8 +1,8 @@
 #include "app/ServiceHost.h"
 
 #include "common/VelaReportingLogCategories.h"
-#include "platform/dbus/AccessRule.h"
 #include "platform/dbus/Protocol.h"
+#include "tracing/TraceRunner.h"
 
 #include <chrono>
 
@@ -17,17 +17,47 @@ const LogCategory& hostLog() { return VelaReportingServiceDelegateCategory(); }
 
 constexpr std::uint32_t kFolderPermissions = 0755;
 
+platform::dbus::AccessRule accessRuleOf(const Settings& settings) {
+    std::vector<std::string> unknown;
+    platform::dbus::AccessRule rule =
+        platform::dbus::AccessRule::ofNames(settings.access.users, settings.access.groups, unknown);
+    for (const std::string& name : unknown) {
+        hostLog().error("access: this system knows no %@", name);
+    }
+    return rule;
+}
+
+/// Who may connect as a group may emit trace events, too: the first one named, as a folder has one group.
+platform::LinuxSpoorOptions spoorOptionsOf(const Settings& settings, const platform::dbus::AccessRule& access) {
+    platform::LinuxSpoorOptions options;
+    options.runtimeFolder = settings.paths.runtime;
+    if (!access.groups().empty()) {
+        options.emitterGroup = access.groups().front();
+    }
+    return options;
+}
+
+platform::PerfProbe::Options probeOptionsOf(const std::string& pathRoot) {
+    platform::PerfProbe::Options options;
+    options.folder = pathRoot + std::string(VelaReportingTracingLogsDirectory);
+    return options;
+}
+
 } // namespace
 
 ServiceHost::ServiceHost(const Settings& settings, ServicePlatform& servicePlatform, platform::ServiceManager& manager)
     : settings_(settings),
       platform_(servicePlatform),
       manager_(manager),
+      pathRoot_(settings.paths.root == "/" ? std::string() : settings.paths.root),
+      access_(accessRuleOf(settings)),
       buildType_(servicePlatform.deviceProperties()),
       ledger_(servicePlatform.processes().ownPid()),
       memory_({settings.limits.sessionBytes, settings.limits.totalBytes}),
       hwStats_(platform::hwStatsOptionsOf(settings), servicePlatform.clock()),
-      probe_(servicePlatform.queues().background()) {}
+      spoor_(spoorOptionsOf(settings, access_), servicePlatform.clock()),
+      probe_(probeOptionsOf(pathRoot_), servicePlatform.clock(), servicePlatform.queues().background()),
+      metricsheet_(servicePlatform.fileSystem()) {}
 
 platform::Result<platform::Done> ServiceHost::serve() {
     auto backends =
@@ -37,9 +67,7 @@ platform::Result<platform::Done> ServiceHost::serve() {
     }
     backends_ = *std::move(backends);
     facilities_ = std::make_unique<platform::Platform>(facilities(*backends_));
-    const std::string& root = settings_.paths.root;
-    delegate_ =
-        VelaReportingServiceDelegate::init({*facilities_, root == "/" ? std::string() : root, &memory_, &ledger_});
+    delegate_ = VelaReportingServiceDelegate::init({*facilities_, pathRoot_, &memory_, &ledger_});
     backends_->setInspection(*delegate_);
     auto endpoint = openEndpoint();
     if (!endpoint) {
@@ -69,6 +97,7 @@ platform::Platform ServiceHost::facilities(DeliveryBackends& backends) {
             .notifications = platform_.notifications(),
             .preferences = platform_.preferences(),
             .probe = probe_,
+            .processControl = processControl_,
             .processInformation = platform_.processes(),
             .propertyListReading = platform_.propertyLists(),
             .spoor = spoor_,
@@ -100,11 +129,7 @@ platform::Result<std::unique_ptr<platform::DbusServiceEndpoint>> ServiceHost::op
 
 platform::DbusServiceOptions ServiceHost::endpointOptions() {
     platform::DbusServiceOptions options;
-    std::vector<std::string> unknown;
-    options.access = platform::dbus::AccessRule::ofNames(settings_.access.users, settings_.access.groups, unknown);
-    for (const std::string& name : unknown) {
-        hostLog().error("access: this system knows no %@", name);
-    }
+    options.access = access_;
     options.version = VELA_VERSION;
     options.messageBytes = settings_.limits.messageBytes;
     options.valueDepth = settings_.limits.valueDepth;

@@ -8,13 +8,18 @@
 #include "common/Settings.h"
 #include "common/VelaReportingUtility.h"
 #include "platform/Ipc.h"
-#include "platform/absent/AbsentFacilities.h"
+#include "platform/dbus/AccessRule.h"
 #include "platform/dbus/ServiceEndpoint.h"
 #include "platform/hwstats/LinuxHwStats.h"
+#include "platform/linux/LinuxMetricsheet.h"
+#include "platform/linux/LinuxProcessControl.h"
 #include "platform/linux/ServiceManager.h"
+#include "platform/perf/PerfProbe.h"
+#include "platform/spoor/LinuxSpoor.h"
 #include "service/VelaReportingServiceDelegate.h"
 
 #include <memory>
+#include <string>
 
 namespace vela {
 
@@ -38,13 +43,16 @@ private:
     const Settings& settings_;
     ServicePlatform& platform_;
     platform::ServiceManager& manager_;
+    const std::string pathRoot_; ///< empty for "/"
+    const platform::dbus::AccessRule access_;
     const VelaReportingBuildType buildType_;
     DeliveryLedger ledger_;
     VelaReportingSessionMemory memory_;
     platform::LinuxHwStats hwStats_;
-    platform::AbsentSpoor spoor_;
-    platform::AbsentProbe probe_;
-    platform::AbsentMetricsheet metricsheet_;
+    platform::LinuxSpoor spoor_;
+    platform::PerfProbe probe_;
+    platform::LinuxProcessControl processControl_;
+    platform::LinuxMetricsheet metricsheet_;
     std::unique_ptr<DeliveryBackends> backends_;
     std::unique_ptr<platform::Platform> facilities_;
     std::shared_ptr<VelaReportingServiceDelegate> delegate_;

@@ -1,5 +1,6 @@
 #include "cli/Subcommand.h"
 
+#include "cli/TraceCommand.h"
 #include "common/SettingValues.h"
 
 #include <algorithm>
@@ -11,7 +12,7 @@ namespace vela {
 
 namespace {
 
-constexpr std::array<Subcommand, 10> kSubcommands{{
+constexpr std::array<Subcommand, 11> kSubcommands{{
     {"status", "[--ledger] [--json]", "what the service is doing, and what became of all deliveries", runStatus},
     {"sessions", "[--json]", "the reporting sessions of every client", runSessions},
     {"call", "[OPERATION [JSON]...]", "calls one operation and prints the reply; alone it lists the operations",
@@ -24,6 +25,7 @@ constexpr std::array<Subcommand, 10> kSubcommands{{
     {"notify", "NAME [STATE]", "posts a notification", runNotify},
     {"drivers", "[--settings FILE] [--set SECTION.KEY=VALUE]... [--watch [--count N]] [--json]",
      "the channels of driver statistics and their values", runDrivers},
+    {"trace", kTraceArguments, "emits a kernel-trace event; reports what a trace run measured", runTrace},
     {"settings", "[--settings FILE] [--set SECTION.KEY=VALUE]... [--json | --example]",
      "the settings in force and where each comes from", runSettings},
     {"plist", "FILE [--to json|xml|binary|text]", "prints a property list in another form", runPlist},

@@ -47,6 +47,7 @@ int runDefaults(std::span<const std::string_view> arguments, Console& console);
 int runNotify(std::span<const std::string_view> arguments, Console& console);
 int runDrivers(std::span<const std::string_view> arguments, Console& console);
 int runSettings(std::span<const std::string_view> arguments, Console& console);
+int runTrace(std::span<const std::string_view> arguments, Console& console);
 int runPlist(std::span<const std::string_view> arguments, Console& console);
 
 } // namespace vela

@@ -33,7 +33,8 @@ symbols=$(nm -D --defined-only "$libraries/libvelareporting.so" | awk '{print $3
 [[ -n $symbols ]] || fail "the library shows nothing"
 strangers=$(grep -v '^VelaReporting[A-Za-z]*@@VELAREPORTING_0$' <<<"$symbols" || true)
 [[ -z $strangers ]] || fail "the library shows more than its functions: $strangers"
-declared=$(grep -ohE 'VelaReporting[A-Za-z]+\(' "$here/include/vela/channels.h" "$here/include/vela/reporting.h" | tr -d '(' | sort -u)
+declared=$(grep -ohE 'VelaReporting[A-Za-z]+[(;]' "$here/include/vela/channels.h" "$here/include/vela/reporting.h" \
+    "$here/include/vela/trace.h" | tr -d '(;' | sort -u)
 while IFS= read -r symbol; do
     grep -qx "${symbol%%@@*}" <<<"$declared" || fail "$symbol is not declared in a header"
 done <<<"$symbols"
@@ -48,6 +49,13 @@ run "$work/example_c"
 "$cc" -std=c99 -Wall -Wextra -Wpedantic -Werror -o "$work/channels_example" "$here/channels_example.c" "${flags[@]}"
 VELA_RUNTIME=$work LD_LIBRARY_PATH=$libraries "$work/channels_example" 1 >"$work/channels.log"
 [[ -n $(find "$work/hwstats" -name '*.channels') ]] || fail "channels_example published nothing"
+
+"$cc" -std=c99 -Wall -Wextra -Wpedantic -Werror -o "$work/trace_example" "$here/trace_example.c" "${flags[@]}"
+traced=$(VELA_RUNTIME=$work LD_LIBRARY_PATH=$libraries "$work/trace_example" 1)
+[[ $traced == "1 intervals emitted" ]] || fail "trace_example said: $traced"
+# A program that is not made for any place has a copy of the library's data.
+"$cc" -std=c99 -fno-pie -no-pie -o "$work/trace_example_fixed" "$here/trace_example.c" "${flags[@]}"
+VELA_RUNTIME=$work LD_LIBRARY_PATH=$libraries "$work/trace_example_fixed" 1 >"$work/trace.log"
 
 "$cmake" -S "$here/package_test" -B "$work/cmake" -DCMAKE_C_COMPILER="$cc" -DCMAKE_CXX_COMPILER="$cxx" \
     -DCMAKE_PREFIX_PATH="$(dirname -- "$libraries")" -DCMAKE_FIND_ROOT_PATH="$tree" >"$work/configure.log"

@@ -1,6 +1,7 @@
 // Files and folders. Paths are absolute unless an operation says otherwise; failures carry the system's own words.
 #pragma once
 
+#include "platform/Identity.h"
 #include "platform/Result.h"
 
 #include <cstddef>
@@ -21,6 +22,9 @@ public:
     /// does nothing: `commit` tells.
     virtual void append(std::string_view piece) = 0;
 
+    /// Why nothing more can be written, or null. A creation that failed tells at once.
+    virtual const Failure* failure() const = 0;
+
     /// Puts the file into its place, or answers the first failure. The last call of all.
     virtual Result<Done> commit() = 0;
 };
@@ -33,6 +37,12 @@ public:
     /// The whole content of a regular file of at most `limit` bytes; anything else (a folder, a device, a larger file)
     /// is refused.
     virtual Result<std::string> readFile(const std::string& path, std::size_t limit) const = 0;
+
+    /// As `readFile`, with the rights of `reader` and no others: what they may not read is refused (EACCES), whatever
+    /// the service itself may. For paths that somebody else named. Nothing but a regular file is opened, and no wait
+    /// for one.
+    virtual Result<std::string> readFileFor(const Identity& reader, const std::string& path,
+                                            std::size_t limit) const = 0;
 
     /// Begins a file at `path` that is written in pieces. A reader sees the old file or the whole new one, never a
     /// part: a new file beside it, opened exclusively and without following links, then renamed. `permissions` hold

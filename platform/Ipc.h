@@ -2,6 +2,7 @@
 #pragma once
 
 #include "common/values/Dictionary.h"
+#include "platform/Identity.h"
 #include "platform/Result.h"
 #include "platform/UniqueFunction.h"
 
@@ -65,6 +66,8 @@ public:
 
     /// The peer's process, by the operating system's word.
     virtual std::int32_t processIdentifier() const = 0;
+    /// On whose behalf the peer connected, by the operating system's word; none where that is not known whole.
+    virtual std::optional<Identity> peerIdentity() const = 0;
     virtual void setExportedObject(std::shared_ptr<ReportingServiceProtocol> object) = 0;
     virtual void setInterruptionHandler(UniqueFunction<void()> handler) = 0;
     /// Called once, after the last operation that the client sent.

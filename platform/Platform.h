@@ -14,6 +14,7 @@
 #include "platform/Notifications.h"
 #include "platform/Preferences.h"
 #include "platform/Probe.h"
+#include "platform/ProcessControl.h"
 #include "platform/ProcessInformation.h"
 #include "platform/PropertyListReading.h"
 #include "platform/Spoor.h"
@@ -36,6 +37,7 @@ struct Platform {
     Notifications& notifications;
     Preferences& preferences;
     Probe& probe;
+    ProcessControl& processControl;
     ProcessInformation& processInformation;
     PropertyListReading& propertyListReading;
     Spoor& spoor;

@@ -42,6 +42,7 @@ class Probe {
 public:
     virtual ~Probe() = default;
 
+    /// Null for a template that there is not; 1 is always there. What cannot be traced is told by the session's start.
     virtual std::shared_ptr<ProbeTraceConfig> makeProbeTraceConfig(int templateNumber) = 0;
     virtual std::shared_ptr<ProbeTraceSession> createProbeTraceSession(const ProbeTraceConfig& config) = 0;
 };

@@ -19,6 +19,7 @@ struct SpoorEvent {
     std::uint32_t cpu = 0;
     std::int64_t wallTimeSeconds = 0;
     std::int32_t wallTimeMicroseconds = 0;
+    std::int32_t processID = 0; ///< as the emitter says; 0 where it says nothing
 };
 
 /// Used by one thread at a time but for what says otherwise. Every session that was ended completes exactly once, also

@@ -15,9 +15,13 @@
 #include "testing/FakeJoule.h"
 #include "testing/FakeJsonWriting.h"
 #include "testing/FakeMalady.h"
+#include "testing/FakeMetricsheet.h"
 #include "testing/FakeNotifications.h"
 #include "testing/FakePreferences.h"
+#include "testing/FakeProbe.h"
+#include "testing/FakeProcessControl.h"
 #include "testing/FakeProcessInformation.h"
+#include "testing/FakePropertyListReading.h"
 #include "testing/FakeSpoor.h"
 #include "testing/FakeTally.h"
 #include "testing/FakeTelem.h"
@@ -161,34 +165,13 @@ private:
     }
 };
 
-// Facilities that this folder hands on and does not use.
-struct NoProbe final : platform::Probe {
-    std::shared_ptr<platform::ProbeTraceConfig> makeProbeTraceConfig(int) override { return nullptr; }
-    std::shared_ptr<platform::ProbeTraceSession> createProbeTraceSession(const platform::ProbeTraceConfig&) override {
-        return nullptr;
-    }
-};
-struct NoMetricsheet final : platform::Metricsheet {
-    std::unique_ptr<platform::MetricsheetWriter> openWriter(const std::string&, std::string_view,
-                                                            std::uint32_t) override {
-        return nullptr;
-    }
-};
-struct NoPropertyListReading final : platform::PropertyListReading {
-    platform::Result<Value> read(std::string_view, const platform::PropertyListLimits&) const override {
-        return platform::Failure{};
-    }
-    platform::Result<std::string> write(ValueRef, platform::PropertyListFormat) const override {
-        return platform::Failure{};
-    }
-};
-
 /// Everything of the platform but the clock and the queues.
 struct FakeFacilities {
     FakeFacilities() {
         processes.add({.pid = 7, .parent = 1, .commandName = "player", .startTimeTicks = 5});
         processes.add({.pid = 8, .parent = 1, .commandName = "recorder", .startTimeTicks = 6});
         beacon.setDiscovery(BeaconDiscovery::FindsBackends);
+        probe.completeWhenStopped("file:///traces/1.data");
     }
 
     testing::FakeBeacon beacon;
@@ -204,14 +187,16 @@ struct FakeFacilities {
     testing::FakeSpoor spoor;
     testing::FakeTally tally;
     testing::FakeTelem telem;
-    NoMetricsheet metricsheet;
-    NoProbe probe;
-    NoPropertyListReading propertyListReading;
+    testing::FakeMetricsheet metricsheet;
+    testing::FakeProbe probe;
+    testing::FakeProcessControl processControl;
+    testing::FakePropertyListReading propertyListReading;
 
     platform::Platform platformWith(platform::Clock& clock, platform::WorkQueues& queues) {
-        return {beacon, clock,       device,        fileSystem,  hwStats, joule,     json,
-                malady, metricsheet, notifications, preferences, probe,   processes, propertyListReading,
-                spoor,  tally,       telem,         queues};
+        return {beacon,      clock, device,         fileSystem,  hwStats,
+                joule,       json,  malady,         metricsheet, notifications,
+                preferences, probe, processControl, processes,   propertyListReading,
+                spoor,       tally, telem,          queues};
     }
 };
 

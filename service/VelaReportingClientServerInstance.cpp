@@ -29,16 +29,19 @@ std::uint16_t serviceTypeOf(const std::shared_ptr<VelaReportingSession>& session
 
 std::shared_ptr<VelaReportingClientServerInstance>
 VelaReportingClientServerInstance::initWithPID(std::int32_t pid, std::weak_ptr<Delegate> delegate,
-                                               std::shared_ptr<const VelaReportingServiceContext> context) {
-    return std::make_shared<VelaReportingClientServerInstance>(Private(), pid, std::move(delegate), std::move(context));
+                                               std::shared_ptr<const VelaReportingServiceContext> context,
+                                               std::optional<platform::Identity> identity) {
+    return std::make_shared<VelaReportingClientServerInstance>(Private(), pid, std::move(delegate), std::move(context),
+                                                               std::move(identity));
 }
 
 VelaReportingClientServerInstance::VelaReportingClientServerInstance(
     Private, std::int32_t pid, std::weak_ptr<Delegate> delegate,
-    std::shared_ptr<const VelaReportingServiceContext> context)
+    std::shared_ptr<const VelaReportingServiceContext> context, std::optional<platform::Identity> identity)
     : processIdentifier_(pid),
       delegate_(std::move(delegate)),
-      context_(std::move(context)) {
+      context_(std::move(context)),
+      identity_(std::move(identity)) {
     serviceLog().standard("new client with pid %lu", pid);
 }
 
@@ -51,7 +54,7 @@ void VelaReportingClientServerInstance::createReportingSession(std::int64_t repo
         const LogReporterScope scope(reporterID);
         serviceLog().debug("creating session for reporter %lli", reporterID);
         const std::shared_ptr<VelaReportingSession> session =
-            VelaReportingSession::initWithID(reporterID, {processIdentifier_}, context_->sessionPlatform);
+            VelaReportingSession::initWithID(reporterID, {processIdentifier_}, context_->sessionPlatform, identity_);
         // What it replaces is let go as it is, without a stop: wanted.
         storeSession(reporterID, session);
         // One more than at the start, where the session itself counts: wanted.

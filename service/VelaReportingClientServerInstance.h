@@ -7,6 +7,7 @@
 #pragma once
 
 #include "platform/Clock.h"
+#include "platform/Identity.h"
 #include "platform/Ipc.h"
 #include "platform/Mutex.h"
 #include "service/VelaReportingServiceContext.h"
@@ -33,12 +34,14 @@ public:
     using Delegate = VelaReportingServiceDelegateProtocol;
     using Sessions = Delegate::Sessions;
 
-    /// `pid`: the client's process.
+    /// `pid`: the client's process. `identity`: on whose behalf it calls; none where that is not known.
     static std::shared_ptr<VelaReportingClientServerInstance>
     initWithPID(std::int32_t pid, std::weak_ptr<Delegate> delegate,
-                std::shared_ptr<const VelaReportingServiceContext> context);
+                std::shared_ptr<const VelaReportingServiceContext> context,
+                std::optional<platform::Identity> identity = std::nullopt);
     VelaReportingClientServerInstance(Private, std::int32_t pid, std::weak_ptr<Delegate> delegate,
-                                      std::shared_ptr<const VelaReportingServiceContext> context);
+                                      std::shared_ptr<const VelaReportingServiceContext> context,
+                                      std::optional<platform::Identity> identity);
     ~VelaReportingClientServerInstance() override;
     VelaReportingClientServerInstance(const VelaReportingClientServerInstance&) = delete;
     VelaReportingClientServerInstance& operator=(const VelaReportingClientServerInstance&) = delete;
@@ -129,6 +132,7 @@ private:
     const std::int32_t processIdentifier_;
     const std::weak_ptr<Delegate> delegate_;
     const std::shared_ptr<const VelaReportingServiceContext> context_;
+    const std::optional<platform::Identity> identity_;
 
     // Changed on the reporting queue, read on any thread. Held for a few instructions only, and inside the delegate's
     // lock where both are taken.

@@ -30,9 +30,14 @@ struct VelaReportingServiceContext {
           tallyBridge(std::move(tally)),
           jouleUtility(std::move(joule)),
           telemBridge(std::move(telem)),
-          sessionPlatform{platform.beacon,        platform.clock,        platform.fileSystem, platform.jsonWriting,
-                          platform.spoor,         platform.workQueues,   *tallyBridge,        servicePlatform.pathRoot,
-                          servicePlatform.memory, servicePlatform.ledger} {}
+          tracePlatform{platform.deviceProperties,
+                        platform.probe,
+                        platform.propertyListReading,
+                        {platform.fileSystem, platform.metricsheet, platform.processControl, platform.spoor,
+                         platform.workQueues, servicePlatform.pathRoot}},
+          sessionPlatform{platform.beacon,        platform.clock,         platform.fileSystem, platform.jsonWriting,
+                          platform.spoor,         platform.workQueues,    *tallyBridge,        servicePlatform.pathRoot,
+                          servicePlatform.memory, servicePlatform.ledger, &tracePlatform} {}
     VelaReportingServiceContext(const VelaReportingServiceContext&) = delete;
     VelaReportingServiceContext& operator=(const VelaReportingServiceContext&) = delete;
     ~VelaReportingServiceContext() = default;
@@ -42,6 +47,7 @@ struct VelaReportingServiceContext {
     const EventHandler tallyBridge;
     const EventHandler jouleUtility;
     const EventHandler telemBridge;
+    const VelaReportingTracePlatform tracePlatform;
     const VelaReportingSessionPlatform sessionPlatform;
 };
 

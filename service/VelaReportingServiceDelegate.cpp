@@ -84,7 +84,8 @@ bool VelaReportingServiceDelegate::shouldAcceptNewConnection(
     std::shared_ptr<VelaReportingClientServerInstance> client;
     {
         const RecursiveMutexLock lock(lock_);
-        client = VelaReportingClientServerInstance::initWithPID(pid, weak_from_this(), context_);
+        client =
+            VelaReportingClientServerInstance::initWithPID(pid, weak_from_this(), context_, connection->peerIdentity());
         connection->setExportedObject(client);
     }
     // Before the connection is resumed, so that it runs ahead of every call.

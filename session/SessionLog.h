@@ -1,4 +1,4 @@
-// The two logs of a session. Whatever file a line is written in, it carries the session's name.
+// The logs of a session. Whatever file a line is written in, it carries the session's name.
 #pragma once
 
 #include "common/VelaReportingLogCategories.h"
@@ -9,5 +9,8 @@ inline NamedLogCategory sessionLog() { return VelaReportingSessionCategory().as(
 
 /// Of the real-time reporting path: set-up, queued messages, single messages, end.
 inline NamedLogCategory beaconLog() { return VelaReportingSessionBeaconReportingCategory().as("VelaReportingSession"); }
+
+/// Of its performance trace.
+inline NamedLogCategory traceLog() { return VelaReportingTraceCategory().as("VelaReportingSession"); }
 
 } // namespace vela

@@ -120,7 +120,7 @@ protected:
         return *session_;
     }
     std::shared_ptr<VelaReportingSession> makeSession(std::int64_t reporterID) {
-        return VelaReportingSession::initWithID(reporterID, {7, 1}, platform_);
+        return VelaReportingSession::initWithID(reporterID, {7, 1}, platform_, client_);
     }
     void release() { session_.reset(); }
 
@@ -177,6 +177,7 @@ protected:
     RecordingAnalytics analytics_;
     VelaReportingBuildType buildType_{device_};
     VelaReportingSessionPlatform platform_{beacon_, clock_, fileSystem_, json_, spoor_, queues_, analytics_, ""};
+    std::optional<platform::Identity> client_;
 
 private:
     std::shared_ptr<VelaReportingSession> session_;

@@ -13,14 +13,16 @@ namespace vela {
 
 std::shared_ptr<VelaReportingSession>
 VelaReportingSession::initWithID(std::int64_t reporterID, std::vector<std::int32_t> processIdentifiers,
-                                 const VelaReportingSessionPlatform& sessionPlatform) {
-    return std::make_shared<VelaReportingSession>(Private(), reporterID, std::move(processIdentifiers),
-                                                  sessionPlatform);
+                                 const VelaReportingSessionPlatform& sessionPlatform,
+                                 std::optional<platform::Identity> client) {
+    return std::make_shared<VelaReportingSession>(Private(), reporterID, std::move(processIdentifiers), sessionPlatform,
+                                                  std::move(client));
 }
 
 VelaReportingSession::VelaReportingSession(Private, std::int64_t reporterID,
                                            std::vector<std::int32_t> processIdentifiers,
-                                           const VelaReportingSessionPlatform& sessionPlatform)
+                                           const VelaReportingSessionPlatform& sessionPlatform,
+                                           std::optional<platform::Identity> client)
     : reporterID_(reporterID),
       processIdentifiers_(std::move(processIdentifiers)),
       platform_(sessionPlatform),
@@ -31,7 +33,10 @@ VelaReportingSession::VelaReportingSession(Private, std::int64_t reporterID,
       ledgerEntry_(sessionPlatform.ledger == nullptr
                        ? nullptr
                        : sessionPlatform.ledger->open(processIdentifiers_.empty() ? 0 : processIdentifiers_.front(),
-                                                      reporterID)) {
+                                                      reporterID)),
+      tracing_(sessionPlatform.tracing == nullptr
+                   ? nullptr
+                   : VelaReportingSessionTracing::init(reporterID, std::move(client), *sessionPlatform.tracing)) {
     const LogReporterScope scope(reporterID_);
     sessionLog().info("created reporting session for ID: %lli", reporterID_);
     platform_.spoor.emit(kTraceInit);
@@ -65,6 +70,9 @@ void VelaReportingSession::start() {
         beaconReportingQueue().post(
             [self = shared_from_this(), setup = std::move(setup)] { self->setupBeaconReporting(setup); });
     }
+    if (tracing_ != nullptr) {
+        tracing_->start(traceSubject());
+    }
 }
 
 void VelaReportingSession::stop() {
@@ -81,6 +89,9 @@ void VelaReportingSession::stop() {
     sendSummaryEvent();
     if (beaconReportingEnabled_) {
         beaconReportingQueue().post([self = shared_from_this()] { self->endBeaconReporting(); });
+    }
+    if (tracing_ != nullptr) {
+        tracing_->stop(traceSubject());
     }
     endList();
     started_ = false;
@@ -194,6 +205,14 @@ void VelaReportingSession::setServiceType(std::uint16_t serviceType) {
 
 std::string_view VelaReportingSession::serviceName() const {
     return VelaReportingUtilityGenerateServiceNameFromServiceType(serviceType());
+}
+
+VelaReportingSessionTracing::Subject VelaReportingSession::traceSubject() const {
+    return {serviceType(), serviceName(), configuration()};
+}
+
+std::optional<std::string> VelaReportingSession::getProbeTraceFileURL() const {
+    return tracing_ == nullptr ? std::nullopt : tracing_->finalTraceURL();
 }
 
 Dictionary VelaReportingSession::configuration() const {

@@ -20,12 +20,14 @@
 #include "platform/Clock.h"
 #include "platform/FileSystem.h"
 #include "platform/HwStats.h"
+#include "platform/Identity.h"
 #include "platform/JsonWriting.h"
 #include "platform/Mutex.h"
 #include "platform/Spoor.h"
 #include "platform/WorkQueue.h"
 #include "session/VelaReportingSessionMemory.h"
 #include "session/VelaReportingSessionMessageList.h"
+#include "session/VelaReportingSessionTracing.h"
 #include "session/VelaReportingStartTransaction.h"
 
 #include <atomic>
@@ -66,6 +68,7 @@ struct VelaReportingSessionPlatform {
     std::string pathRoot;                         ///< what absolute paths of the service stand under; empty for "/"
     VelaReportingSessionMemory* memory = nullptr; ///< bounds what sessions keep; null for no bounds
     DeliveryLedger* ledger = nullptr;             ///< counts what becomes of messages; null where nobody asks
+    const VelaReportingTracePlatform* tracing = nullptr; ///< performance traces; null for none
 };
 
 class VelaReportingSession : public std::enable_shared_from_this<VelaReportingSession> {
@@ -77,23 +80,26 @@ public:
     /// Called with no error when what was asked of the session is queued, or with what became of a single message.
     using ErrorReply = platform::UniqueFunction<void(const std::optional<platform::Failure>& error)>;
 
-    /// `processIdentifiers`: pids of the client, its own first. `sessionPlatform` outlives the session.
+    /// `processIdentifiers`: pids of the client, its own first. `sessionPlatform` outlives the session. `client`: whose
+    /// rights files are read with that the client names; without one none is read.
     static std::shared_ptr<VelaReportingSession> initWithID(std::int64_t reporterID,
                                                             std::vector<std::int32_t> processIdentifiers,
-                                                            const VelaReportingSessionPlatform& sessionPlatform);
+                                                            const VelaReportingSessionPlatform& sessionPlatform,
+                                                            std::optional<platform::Identity> client = std::nullopt);
     VelaReportingSession(Private, std::int64_t reporterID, std::vector<std::int32_t> processIdentifiers,
-                         const VelaReportingSessionPlatform& sessionPlatform);
+                         const VelaReportingSessionPlatform& sessionPlatform, std::optional<platform::Identity> client);
     ~VelaReportingSession();
     VelaReportingSession(const VelaReportingSession&) = delete;
     VelaReportingSession& operator=(const VelaReportingSession&) = delete;
 
     // Life. Calls of `start` and `stop` come from one thread at a time.
 
-    /// Begins a new list of messages and queues the set-up of real-time reporting; does not wait for it. A session that
-    /// is started already stays as it is.
+    /// Begins a new list of messages, queues the set-up of real-time reporting, without waiting for it, and starts the
+    /// performance trace where there is to be one. A session that is started already stays as it is.
     void start();
 
     /// Sends the volume messages, writes the session file, sends the summary and queues the end of real-time reporting.
+    /// Waits for the end of the performance trace, for ever if need be.
     void stop();
 
     // Messages.
@@ -162,6 +168,11 @@ public:
 
     bool shouldReportOrientation() const { return false; }
 
+    /// Null where there are no performance traces.
+    VelaReportingSessionTracing* tracing() const { return tracing_.get(); }
+    /// File URL of the last platform trace that completed; none before.
+    std::optional<std::string> getProbeTraceFileURL() const;
+
     /// What its deliveries are counted in; null where nobody asks.
     const std::shared_ptr<LedgerEntry>& ledgerEntry() const { return ledgerEntry_; }
 
@@ -195,6 +206,7 @@ private:
     enum class Limits : std::uint8_t { Hold, Lifted };
 
     platform::SerialQueue& beaconReportingQueue();
+    VelaReportingSessionTracing::Subject traceSubject() const;
 
     void setupBeaconReporting(const BeaconSetup& setup);
     void createBeaconReportingSession(const BeaconSetup& setup);
@@ -222,6 +234,7 @@ private:
     const std::unique_ptr<platform::Semaphore> beaconreportingBackendSemaphore_;
     const std::shared_ptr<VelaReportingSessionBudget> budget_; ///< null where nothing bounds the session
     const std::shared_ptr<LedgerEntry> ledgerEntry_;
+    const std::shared_ptr<VelaReportingSessionTracing> tracing_; ///< null where there are none
 
     // Confined to the thread that starts and stops the session.
     std::optional<VelaReportingDriverSnapShot> driverSnapShot_;

@@ -25,6 +25,16 @@ std::string folderOf(const std::string& path) {
     return slash == 0 || slash == std::string::npos ? "/" : path.substr(0, slash);
 }
 
+/// By the three bits of the owner, the group or the others, whichever fits first; root may do everything.
+bool allows(std::uint32_t permissions, std::uint32_t user, std::uint32_t group, const platform::Identity& reader,
+            std::uint32_t right) {
+    if (reader.user == 0) {
+        return true;
+    }
+    const unsigned shift = reader.user == user ? 6 : (reader.isInGroup(group) ? 3 : 0);
+    return ((permissions >> shift) & right) != 0;
+}
+
 } // namespace
 
 class FakeFileSystem::Pending final : public platform::PendingFile {
@@ -32,30 +42,42 @@ public:
     Pending(FakeFileSystem& fileSystem, std::string path, std::uint32_t permissions)
         : fileSystem_(fileSystem),
           path_(std::move(path)),
-          permissions_(permissions) {}
+          permissions_(permissions) {
+        const MutexLock lock(fileSystem_.mutex_);
+        const int error = fileSystem_.checkWritable(path_);
+        fail(error == EISDIR ? 0 : error); // a folder in the file's place is met when the file gets its name
+    }
 
     void append(std::string_view piece) override {
-        if (error_ == 0) {
-            error_ = fileSystem_.checkPiece(path_, content_.size(), piece);
+        if (!failure_) {
+            fail(fileSystem_.checkPiece(path_, content_.size(), piece));
         }
-        if (error_ == 0) {
+        if (!failure_) {
             content_ += piece;
         }
     }
 
+    const platform::Failure* failure() const override { return failure_ ? &*failure_ : nullptr; }
+
     platform::Result<platform::Done> commit() override {
-        if (error_ != 0) {
-            return failureOf("write", path_, error_);
+        if (failure_) {
+            return *failure_;
         }
         return fileSystem_.put(path_, std::move(content_), permissions_);
     }
 
 private:
+    void fail(int error) {
+        if (error != 0) {
+            failure_ = failureOf("write", path_, error);
+        }
+    }
+
     FakeFileSystem& fileSystem_;
     const std::string path_;
     const std::uint32_t permissions_;
     std::string content_;
-    int error_ = 0; ///< the first
+    std::optional<platform::Failure> failure_; ///< the first
 };
 
 FakeFileSystem::FakeFileSystem() {
@@ -118,8 +140,51 @@ std::size_t FakeFileSystem::longestPiece() const {
     return longestPiece_;
 }
 
+void FakeFileSystem::setOwner(const std::string& path, std::uint32_t user, std::uint32_t group) {
+    const MutexLock lock(mutex_);
+    Node& node = nodes_.at(path);
+    node.user = user;
+    node.group = group;
+}
+
+std::vector<platform::Identity> FakeFileSystem::readers() const {
+    const MutexLock lock(mutex_);
+    return readers_;
+}
+
 platform::Result<std::string> FakeFileSystem::readFile(const std::string& path, std::size_t limit) const {
     const MutexLock lock(mutex_);
+    return read(path, limit);
+}
+
+platform::Result<std::string> FakeFileSystem::readFileFor(const platform::Identity& reader, const std::string& path,
+                                                          std::size_t limit) const {
+    const MutexLock lock(mutex_);
+    readers_.push_back(reader);
+    if (path.empty()) {
+        return failureOf("open", path, EINVAL);
+    }
+    if (!mayRead(reader, path)) {
+        return failureOf("open", path, EACCES);
+    }
+    return read(path, limit);
+}
+
+bool FakeFileSystem::mayRead(const platform::Identity& reader, const std::string& path) const {
+    constexpr std::uint32_t kRead = 4;
+    constexpr std::uint32_t kSearch = 1;
+    for (std::string folder = path; folder.size() > 1;) {
+        folder = folderOf(folder);
+        const Node* const node = find(folder);
+        if (node != nullptr && !allows(node->permissions, node->user, node->group, reader, kSearch)) {
+            return false;
+        }
+    }
+    const Node* const file = find(path);
+    return file == nullptr || !file->content || allows(file->permissions, file->user, file->group, reader, kRead);
+}
+
+platform::Result<std::string> FakeFileSystem::read(const std::string& path, std::size_t limit) const {
     if (const int error = errorFor(path); error != 0) {
         return failureOf("read", path, error);
     }

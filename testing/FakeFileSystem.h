@@ -1,5 +1,5 @@
 // Files and folders in memory, with failures on demand. Paths are absolute and taken as they are, without "." or links.
-// Thread-safe.
+// Everything is root's until a test says otherwise. Thread-safe.
 #pragma once
 
 #include "platform/FileSystem.h"
@@ -25,6 +25,8 @@ public:
     // What a test arranges.
     /// A file, and the folders above it.
     void addFile(const std::string& path, std::string content, std::uint32_t permissions = 0644);
+    /// Of what is there.
+    void setOwner(const std::string& path, std::uint32_t user, std::uint32_t group);
     void setCurrentDirectory(std::string path);
     /// Every operation on exactly this path fails with `error` (ENOSPC, say); 0 ends it.
     void failOn(const std::string& path, int error);
@@ -38,10 +40,14 @@ public:
     std::optional<std::uint32_t> permissionsOf(const std::string& path) const;
     /// Paths of all files, sorted.
     std::vector<std::string> files() const;
+    /// Those that files were read for, in the order asked.
+    std::vector<platform::Identity> readers() const;
     /// Bytes of the longest piece that a file was given so far.
     std::size_t longestPiece() const;
 
     platform::Result<std::string> readFile(const std::string& path, std::size_t limit) const override;
+    platform::Result<std::string> readFileFor(const platform::Identity& reader, const std::string& path,
+                                              std::size_t limit) const override;
     std::unique_ptr<platform::PendingFile> createFile(const std::string& path, std::uint32_t permissions) override;
     platform::Result<platform::Done> createDirectories(const std::string& path, std::uint32_t permissions) override;
     std::string currentDirectory() const override;
@@ -51,9 +57,14 @@ private:
     struct Node {
         std::optional<std::string> content; ///< none for a folder
         std::uint32_t permissions = 0;
+        std::uint32_t user = 0;
+        std::uint32_t group = 0;
     };
 
     const Node* find(const std::string& path) const VELA_REQUIRES(mutex_);
+    platform::Result<std::string> read(const std::string& path, std::size_t limit) const VELA_REQUIRES(mutex_);
+    /// Whether `reader` may search the folders on the way to `path`, as far as they are there, and read what it names.
+    bool mayRead(const platform::Identity& reader, const std::string& path) const VELA_REQUIRES(mutex_);
     /// The error that this path shall meet, or 0.
     int errorFor(const std::string& path) const VELA_REQUIRES(mutex_);
     /// 0 or an error number.
@@ -68,6 +79,7 @@ private:
     std::map<std::string, int> errors_ VELA_GUARDED_BY(mutex_);
     std::optional<std::size_t> sizeLimit_ VELA_GUARDED_BY(mutex_);
     std::function<void()> observer_ VELA_GUARDED_BY(mutex_);
+    mutable std::vector<platform::Identity> readers_ VELA_GUARDED_BY(mutex_);
     std::size_t longestPiece_ VELA_GUARDED_BY(mutex_) = 0;
     std::string currentDirectory_ VELA_GUARDED_BY(mutex_) = "/";
 };

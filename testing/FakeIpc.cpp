@@ -15,6 +15,16 @@ void FakeIpcConnection::setObserver(std::function<void(std::string_view)> observ
     observer_ = std::move(observer);
 }
 
+void FakeIpcConnection::setPeerIdentity(std::optional<platform::Identity> identity) {
+    const MutexLock lock(mutex_);
+    identity_ = std::move(identity);
+}
+
+std::optional<platform::Identity> FakeIpcConnection::peerIdentity() const {
+    const MutexLock lock(mutex_);
+    return identity_;
+}
+
 std::shared_ptr<platform::ReportingServiceProtocol> FakeIpcConnection::client() const {
     const MutexLock lock(mutex_);
     return object_;

@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -24,6 +25,8 @@ public:
     // What a test arranges.
     /// Called at the start of every call with its name, outside the lock.
     void setObserver(std::function<void(std::string_view call)> observer);
+    /// Nobody knows the peer's until it is set.
+    void setPeerIdentity(std::optional<platform::Identity> identity);
 
     // What a test does. Each handler that is not set is passed over.
     /// The exported object; null when there is none, and after the end.
@@ -44,6 +47,7 @@ public:
     std::vector<std::string> calls() const;
 
     std::int32_t processIdentifier() const override { return pid_; }
+    std::optional<platform::Identity> peerIdentity() const override;
     void setExportedObject(std::shared_ptr<platform::ReportingServiceProtocol> object) override;
     void setInterruptionHandler(platform::UniqueFunction<void()> handler) override;
     void setInvalidationHandler(platform::UniqueFunction<void()> handler) override;
@@ -60,6 +64,7 @@ private:
     mutable Mutex mutex_;
     std::function<void(std::string_view)> observer_ VELA_GUARDED_BY(mutex_);
     std::vector<std::string> calls_ VELA_GUARDED_BY(mutex_);
+    std::optional<platform::Identity> identity_ VELA_GUARDED_BY(mutex_);
     std::shared_ptr<platform::ReportingServiceProtocol> object_ VELA_GUARDED_BY(mutex_);
     Handler interruptionHandler_ VELA_GUARDED_BY(mutex_);
     Handler invalidationHandler_ VELA_GUARDED_BY(mutex_);

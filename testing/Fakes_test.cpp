@@ -4,15 +4,18 @@
 #include "testing/DevicePropertiesContract.h"
 #include "testing/FakeDeviceProperties.h"
 #include "testing/FakeFileSystem.h"
+#include "testing/FakeMetricsheet.h"
 #include "testing/FakeNotifications.h"
 #include "testing/FakePreferences.h"
 #include "testing/FakeProcessInformation.h"
+#include "testing/FakeSpoor.h"
 #include "testing/FileSystemContract.h"
 #include "testing/ManualClock.h"
 #include "testing/ManualWorkQueues.h"
 #include "testing/NotificationsContract.h"
 #include "testing/PreferencesContract.h"
 #include "testing/ProcessInformationContract.h"
+#include "testing/SpoorContract.h"
 
 #include <cerrno>
 #include <gmock/gmock.h>
@@ -33,6 +36,10 @@ struct FileSystemHarness {
     std::optional<std::uint32_t> permissionsOf(const std::string& path) { return fileSystem_.permissionsOf(path); }
     std::vector<std::string> filesBelow() { return fileSystem_.files(); }
     void limitFileSize(std::optional<std::size_t> bytes) { fileSystem_.limitFileSize(bytes); }
+    bool own(const std::string& path, std::uint32_t user, std::uint32_t group) {
+        fileSystem_.setOwner(path, user, group);
+        return true;
+    }
 
     FakeFileSystem fileSystem_;
 };
@@ -48,6 +55,26 @@ struct ProcessInformationHarness {
     std::int32_t gone() { return 201; }
 
     FakeProcessInformation processes_{100, "vela-test"};
+};
+
+struct SpoorHarness {
+    platform::Spoor& spoor() { return spoor_; }
+    platform::SerialQueue& queue() { return *queue_; }
+    bool waitFor(const std::function<bool()>& condition) {
+        queues_.runUntilIdle();
+        return condition();
+    }
+    void settle() { queues_.runUntilIdle(); }
+    bool makeStartsFail() {
+        spoor_.failStart(ENOTSUP);
+        return true;
+    }
+
+    ManualClock clock_;
+    ManualWorkQueues queues_{clock_};
+    FakeSpoor spoor_;
+    std::unique_ptr<platform::SerialQueue> queue_ =
+        queues_.makeSerialQueue("Tracing Queue", platform::QualityOfService::Default);
 };
 
 struct PreferencesHarness {
@@ -101,6 +128,7 @@ INSTANTIATE_TYPED_TEST_SUITE_P(Fake, NotificationsContract, NotificationsHarness
 INSTANTIATE_TYPED_TEST_SUITE_P(Fake, PreferencesContract, PreferencesHarness);
 INSTANTIATE_TYPED_TEST_SUITE_P(Fake, ProcessInformationContract, ProcessInformationHarness);
 INSTANTIATE_TYPED_TEST_SUITE_P(Fake, DevicePropertiesContract, DevicePropertiesHarness);
+INSTANTIATE_TYPED_TEST_SUITE_P(Fake, SpoorContract, SpoorHarness);
 
 namespace {
 
@@ -132,6 +160,96 @@ TEST(FakeFileSystemTest, TheCurrentDirectoryIsTheOneThatWasSet) {
     EXPECT_EQ(fileSystem.currentDirectory(), "/");
     fileSystem.setCurrentDirectory("/srv");
     EXPECT_EQ(fileSystem.currentDirectory(), "/srv");
+}
+
+platform::SpoorEvent eventAt(std::uint64_t timestamp, std::uint32_t code) {
+    platform::SpoorEvent event;
+    event.timestamp = timestamp;
+    event.eventCode = code;
+    return event;
+}
+
+class FakeSpoorTest : public ::testing::Test {
+protected:
+    std::unique_ptr<platform::SpoorSession> makeSession() {
+        auto session = harness_.spoor_.createSession();
+        session->setCompletionHandler([this] { collected_.complete(); });
+        range_ = session->eventsRange(1, 9, [this](const auto& event) { collected_.add(event); });
+        start_ = session->start(harness_.queue());
+        return session;
+    }
+
+    SpoorHarness harness_;
+    CollectedEvents collected_;
+    int range_ = 0;
+    int start_ = 0;
+};
+
+TEST_F(FakeSpoorTest, EventsAreReplayedAsTheyAre) {
+    const auto session = makeSession();
+    harness_.spoor_.replay({eventAt(70, 9), eventAt(50, 10), eventAt(30, 1)});
+    EXPECT_EQ(collected_.size(), 0U);
+    harness_.settle();
+    ASSERT_THAT(collected_.codes(), ElementsAre(9, 1));
+    EXPECT_EQ(collected_.events()[1].timestamp, 30U);
+    EXPECT_THAT(harness_.spoor_.codes(), IsEmpty());
+}
+
+TEST_F(FakeSpoorTest, TimesHaveTheUnitThatWasSet) {
+    harness_.spoor_.setTimeUnit(125, 3);
+    const auto session = makeSession();
+    EXPECT_EQ(session->nanoseconds(1), 41U);
+    EXPECT_EQ(session->nanoseconds(3), 125U);
+}
+
+TEST_F(FakeSpoorTest, ErrorsAreAnswered) {
+    harness_.spoor_.failRange(5);
+    harness_.spoor_.failStart(7);
+    harness_.spoor_.failEnd(9);
+    harness_.spoor_.loseEvents(11);
+    const auto session = makeSession();
+    EXPECT_EQ(range_, 5);
+    EXPECT_EQ(start_, 7);
+    EXPECT_EQ(session->end(), 9);
+    EXPECT_EQ(session->lostEvents(), 11U);
+    harness_.settle();
+    EXPECT_EQ(collected_.completions(), 0);
+}
+
+TEST_F(FakeSpoorTest, ACompletionCanBeHeldBack) {
+    harness_.spoor_.setCompletes(false);
+    const auto session = makeSession();
+    EXPECT_EQ(session->end(), 0);
+    harness_.settle();
+    EXPECT_EQ(collected_.completions(), 0);
+    harness_.spoor_.completeEndedSessions();
+    harness_.spoor_.completeEndedSessions();
+    harness_.settle();
+    EXPECT_EQ(collected_.completions(), 1);
+}
+
+TEST_F(FakeSpoorTest, WhatIsAskedForIsKept) {
+    makeSession()->setWallTimesEnabled(true);
+    EXPECT_THAT(harness_.spoor_.calls(), ElementsAre("create", "completion handler", "range 0x1-0x9",
+                                                     "start Tracing Queue", "wall times on", "destroy"));
+    EXPECT_EQ(harness_.spoor_.liveSessions(), 0U);
+}
+
+TEST(FakeMetricsheetTest, FilesAreKeptAndFaultsComeOnDemand) {
+    FakeMetricsheet metricsheet;
+    const auto writer = metricsheet.openWriter("/a.msj", "VelaReporting", 4);
+    writer->newValue("one", 1.5, "nanoseconds");
+    EXPECT_FALSE(metricsheet.files()[0].closed);
+    EXPECT_TRUE(writer->close());
+    EXPECT_TRUE(metricsheet.files()[0].closed);
+    EXPECT_EQ(metricsheet.files()[0].path, "/a.msj");
+    EXPECT_EQ(metricsheet.files()[0].writerName, "VelaReporting");
+    EXPECT_EQ(metricsheet.files()[0].version, 4U);
+    EXPECT_THAT(metricsheet.files()[0].values, ElementsAre(FakeMetricsheet::Value{"one", 1.5, "nanoseconds"}));
+    metricsheet.failClose(platform::Failure{28, "rename: no"});
+    EXPECT_EQ(metricsheet.openWriter("/b.msj", "", 1)->close().failure().description, "rename: no");
+    metricsheet.setOpens(false);
+    EXPECT_EQ(metricsheet.openWriter("/c.msj", "", 1), nullptr);
 }
 
 TEST(FakeProcessInformationTest, LookUpsAreCounted) {

@@ -3,7 +3,8 @@
 // A harness has: `FileSystem& fileSystem()`; `std::string root()`, an empty folder; `std::optional<std::uint32_t>
 // permissionsOf(path)`, none for what is not there; `std::vector<std::string> filesBelow()`, the paths of all files in
 // the root, sorted; `void limitFileSize(std::optional<std::size_t> bytes)`: files of more bytes cannot be written
-// (EFBIG) until it is called with none.
+// (EFBIG) until it is called with none; `void own(path, user, group)` gives what is there to somebody else, or answers
+// false where it cannot. Everybody may search the root.
 #pragma once
 
 #include "platform/FileSystem.h"
@@ -14,6 +15,7 @@
 #include <gtest/gtest.h>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace vela::testing {
@@ -23,6 +25,17 @@ class FileSystemContract : public ::testing::Test {
 protected:
     platform::FileSystem& fileSystem() { return harness_.fileSystem(); }
     std::string path(const std::string& below) { return harness_.root() + "/" + below; }
+    platform::Result<std::string> readFor(const platform::Identity& reader, const std::string& below) {
+        platform::Result<std::string> read = fileSystem().readFileFor(reader, path(below), 100);
+        EXPECT_TRUE(read) << (read ? "" : read.failure().description);
+        return read ? std::move(read) : platform::Result<std::string>(std::string("nothing"));
+    }
+    void expectDenied(const platform::Identity& reader, const std::string& below) {
+        const platform::Result<std::string> read = fileSystem().readFileFor(reader, path(below), 100);
+        ASSERT_FALSE(read);
+        EXPECT_EQ(read.failure().code, EACCES);
+        EXPECT_EQ(read.failure().description, "open " + path(below) + ": Permission denied");
+    }
 
     Harness harness_;
 };
@@ -42,6 +55,98 @@ TYPED_TEST_P(FileSystemContract, AnEmptyFileIsReadWithALimitOfNothing) {
     const auto read = this->fileSystem().readFile(this->path("a"), 0);
     ASSERT_TRUE(read);
     EXPECT_EQ(*read, "");
+}
+
+// On behalf of others. 4001 and 4002 are users, 4101 and 4102 groups.
+
+TYPED_TEST_P(FileSystemContract, AFileForEverybodyIsReadForAStranger) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "text", 0644));
+    EXPECT_EQ(*this->readFor({4001, 4101}, "a"), "text");
+}
+
+TYPED_TEST_P(FileSystemContract, AFileForItsOwnerIsRefusedToAStranger) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "text", 0600));
+    this->expectDenied({4001, 4101}, "a");
+}
+
+TYPED_TEST_P(FileSystemContract, AFileForItsOwnerIsReadForThem) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "text", 0600));
+    if (!this->harness_.own(this->path("a"), 4001, 4101)) {
+        GTEST_SKIP() << "files cannot be given away here";
+    }
+    EXPECT_EQ(*this->readFor({4001, 4102}, "a"), "text");
+    this->expectDenied({4002, 4101}, "a");
+}
+
+TYPED_TEST_P(FileSystemContract, AFileForAGroupIsReadForThoseInIt) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "text", 0640));
+    if (!this->harness_.own(this->path("a"), 4001, 4101)) {
+        GTEST_SKIP() << "files cannot be given away here";
+    }
+    EXPECT_EQ(*this->readFor({4002, 4101}, "a"), "text");
+    EXPECT_EQ(*this->readFor({4002, 4102, {4103, 4101}}, "a"), "text");
+    this->expectDenied({4002, 4102, {4103}}, "a");
+}
+
+TYPED_TEST_P(FileSystemContract, TheOwnersRightsHoldForTheOwnerAlsoWhereOthersHaveMore) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "text", 0044));
+    if (!this->harness_.own(this->path("a"), 4001, 4101)) {
+        GTEST_SKIP() << "files cannot be given away here";
+    }
+    this->expectDenied({4001, 4101}, "a");
+    EXPECT_EQ(*this->readFor({4002, 4102}, "a"), "text");
+}
+
+TYPED_TEST_P(FileSystemContract, TheGroupsRightsHoldForTheGroupAlsoWhereOthersHaveMore) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "text", 0604));
+    if (!this->harness_.own(this->path("a"), 4001, 4101)) {
+        GTEST_SKIP() << "files cannot be given away here";
+    }
+    this->expectDenied({4002, 4101}, "a");
+    this->expectDenied({4002, 4102, {4101}}, "a");
+}
+
+TYPED_TEST_P(FileSystemContract, AFileBelowAFolderThatTheReaderMayNotSearchIsRefused) {
+    ASSERT_TRUE(this->fileSystem().createDirectories(this->path("closed"), 0755));
+    ASSERT_TRUE(this->fileSystem().createDirectories(this->path("closed/inner"), 0755));
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("closed/inner/a"), "text", 0644));
+    EXPECT_EQ(*this->readFor({4001, 4101}, "closed/inner/a"), "text");
+    ASSERT_TRUE(this->fileSystem().createDirectories(this->path("shut"), 0744)); // to be listed, not to be searched
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("shut/a"), "text", 0644));
+    this->expectDenied({4001, 4101}, "shut/a");
+    this->expectDenied({4001, 4101}, "shut/missing");
+}
+
+TYPED_TEST_P(FileSystemContract, RootReadsEveryFile) {
+    ASSERT_TRUE(this->fileSystem().createDirectories(this->path("shut"), 0700));
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("shut/a"), "text", 0600));
+    this->harness_.own(this->path("shut/a"), 4001, 4101);
+    this->harness_.own(this->path("shut"), 4001, 4101);
+    EXPECT_EQ(*this->readFor({0, 0}, "shut/a"), "text");
+}
+
+TYPED_TEST_P(FileSystemContract, NobodyInParticularReadsWhatIsForEverybody) {
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "text", 0604));
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("b"), "text", 0600));
+    EXPECT_EQ(*this->readFor({}, "a"), "text");
+    this->expectDenied({}, "b");
+}
+
+TYPED_TEST_P(FileSystemContract, WhatIsReadForOthersIsHeldToTheSameRules) {
+    ASSERT_TRUE(this->fileSystem().createDirectories(this->path("folder"), 0755));
+    ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "12345", 0644));
+    const platform::Identity reader{4001, 4101};
+    EXPECT_EQ(this->fileSystem().readFileFor(reader, "", 100).failure().code, EINVAL);
+    const auto missing = this->fileSystem().readFileFor(reader, this->path("missing"), 100);
+    EXPECT_EQ(missing.failure().code, ENOENT);
+    EXPECT_EQ(missing.failure().description, "open " + this->path("missing") + ": No such file or directory");
+    const auto folder = this->fileSystem().readFileFor(reader, this->path("folder"), 100);
+    EXPECT_EQ(folder.failure().code, EISDIR);
+    EXPECT_EQ(folder.failure().description, "read " + this->path("folder") + ": not a regular file");
+    const auto large = this->fileSystem().readFileFor(reader, this->path("a"), 4);
+    EXPECT_EQ(large.failure().code, EFBIG);
+    EXPECT_EQ(large.failure().description, "read " + this->path("a") + ": larger than its limit of 4 bytes");
+    EXPECT_EQ(*this->fileSystem().readFileFor(reader, this->path("a"), 5), "12345");
 }
 
 TYPED_TEST_P(FileSystemContract, AFileAboveTheLimitIsRefusedWithTheLimitsValue) {
@@ -156,8 +261,10 @@ TYPED_TEST_P(FileSystemContract, APieceThatCannotBeWrittenLeavesTheOldFileAndNot
     ASSERT_TRUE(this->fileSystem().writeFileAtomically(this->path("a"), "old", 0600));
     auto file = this->fileSystem().createFile(this->path("a"), 0644);
     file->append("fits");
+    EXPECT_EQ(file->failure(), nullptr);
     this->harness_.limitFileSize(4096);
     file->append(std::string(10'000, 'x'));
+    EXPECT_NE(file->failure(), nullptr);
     this->harness_.limitFileSize(std::nullopt);
     file->append("too late");
     const auto written = file->commit();
@@ -170,9 +277,11 @@ TYPED_TEST_P(FileSystemContract, APieceThatCannotBeWrittenLeavesTheOldFileAndNot
     EXPECT_THAT(this->harness_.filesBelow(), ::testing::ElementsAre(this->path("a")));
 }
 
-TYPED_TEST_P(FileSystemContract, AFileThatCannotBeBegunTellsAtItsEnd) {
+TYPED_TEST_P(FileSystemContract, AFileThatCannotBeBegunTellsAtOnceAndAtItsEnd) {
     const auto file = this->fileSystem().createFile(this->path("missing/a"), 0644);
     ASSERT_NE(file, nullptr);
+    ASSERT_NE(file->failure(), nullptr);
+    EXPECT_EQ(file->failure()->code, ENOENT);
     file->append("1");
     const auto written = file->commit();
     ASSERT_FALSE(written);
@@ -210,17 +319,18 @@ TYPED_TEST_P(FileSystemContract, TheCurrentDirectoryIsAbsolute) {
     EXPECT_TRUE(this->fileSystem().currentDirectory().starts_with('/'));
 }
 
-REGISTER_TYPED_TEST_SUITE_P(FileSystemContract, WhatWasWrittenIsRead, AnEmptyFileIsReadWithALimitOfNothing,
-                            AFileAboveTheLimitIsRefusedWithTheLimitsValue, AFileThatIsNotThereCannotBeRead,
-                            AFolderIsNotReadAsAFile, WritingReplacesContentAndPermissions,
-                            WritingLeavesNothingElseBehind, WritingIntoAMissingFolderFails,
-                            WritingOverAFolderFailsAndLeavesNothingBehind, AnEmptyPathIsRefused,
-                            APathThatEndsInASlashNamesNoFile, APathWithANulIsNotCutThere, AFileOfManyPiecesIsReadWhole,
-                            AFileWithoutPiecesIsEmpty, AFileIsNotSeenBeforeItIsWhole,
-                            AFileThatIsGivenUpLeavesTheOldOneAndNothingElse,
-                            APieceThatCannotBeWrittenLeavesTheOldFileAndNothingElse,
-                            AFileThatCannotBeBegunTellsAtItsEnd, MissingFoldersAreCreatedWithThePermissions,
-                            AFolderThatIsThereKeepsItsPermissions, AFolderMayBeNamedWithASlashAtItsEnd, AFileIsNoFolder,
-                            TheCurrentDirectoryIsAbsolute);
+REGISTER_TYPED_TEST_SUITE_P(
+    FileSystemContract, WhatWasWrittenIsRead, AnEmptyFileIsReadWithALimitOfNothing, AFileForEverybodyIsReadForAStranger,
+    AFileForItsOwnerIsRefusedToAStranger, AFileForItsOwnerIsReadForThem, AFileForAGroupIsReadForThoseInIt,
+    TheOwnersRightsHoldForTheOwnerAlsoWhereOthersHaveMore, TheGroupsRightsHoldForTheGroupAlsoWhereOthersHaveMore,
+    AFileBelowAFolderThatTheReaderMayNotSearchIsRefused, RootReadsEveryFile, NobodyInParticularReadsWhatIsForEverybody,
+    WhatIsReadForOthersIsHeldToTheSameRules, AFileAboveTheLimitIsRefusedWithTheLimitsValue,
+    AFileThatIsNotThereCannotBeRead, AFolderIsNotReadAsAFile, WritingReplacesContentAndPermissions,
+    WritingLeavesNothingElseBehind, WritingIntoAMissingFolderFails, WritingOverAFolderFailsAndLeavesNothingBehind,
+    AnEmptyPathIsRefused, APathThatEndsInASlashNamesNoFile, APathWithANulIsNotCutThere, AFileOfManyPiecesIsReadWhole,
+    AFileWithoutPiecesIsEmpty, AFileIsNotSeenBeforeItIsWhole, AFileThatIsGivenUpLeavesTheOldOneAndNothingElse,
+    APieceThatCannotBeWrittenLeavesTheOldFileAndNothingElse, AFileThatCannotBeBegunTellsAtOnceAndAtItsEnd,
+    MissingFoldersAreCreatedWithThePermissions, AFolderThatIsThereKeepsItsPermissions,
+    AFolderMayBeNamedWithASlashAtItsEnd, AFileIsNoFolder, TheCurrentDirectoryIsAbsolute);
 
 } // namespace vela::testing

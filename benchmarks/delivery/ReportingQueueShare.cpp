@@ -6,6 +6,7 @@
 #include "common/VelaReportingUtility.h"
 #include "platform/absent/AbsentFacilities.h"
 #include "platform/host/SettingsDeviceProperties.h"
+#include "platform/linux/LinuxProcessControl.h"
 #include "platform/linux/LinuxProcessInformation.h"
 #include "service/VelaReportingClientServerInstance.h"
 #include "service/VelaReportingServiceDelegate.h"
@@ -107,6 +108,7 @@ struct LocalConnection final : platform::IpcConnection {
     std::shared_ptr<platform::ReportingServiceProtocol> exported;
 
     std::int32_t processIdentifier() const override { return getpid(); }
+    std::optional<platform::Identity> peerIdentity() const override { return std::nullopt; }
     void setExportedObject(std::shared_ptr<platform::ReportingServiceProtocol> object) override {
         exported = std::move(object);
     }
@@ -161,6 +163,7 @@ private:
     platform::AbsentMetricsheet metricsheet_;
     NoNotifications notifications_;
     NoPreferences preferences_;
+    platform::LinuxProcessControl processControl_;
     platform::LinuxProcessInformation processes_;
     NoPropertyLists propertyLists_;
     DiscardingSpoor spoor_;
@@ -170,9 +173,10 @@ private:
     VelaReportingSessionMemory memory_{{std::uint64_t{4} << 30U, std::uint64_t{8} << 30U}};
     BenchQueues queues_;
     platform::AbsentProbe probe_{queues_.background()};
-    const platform::Platform platform_{beacon_,    clock_,         device_,      fileSystem_,    hwStats_,     joule_,
-                                       json_,      malady_,        metricsheet_, notifications_, preferences_, probe_,
-                                       processes_, propertyLists_, spoor_,       tally_,         telem_,       queues_};
+    const platform::Platform platform_{beacon_,      clock_, device_,         fileSystem_,  hwStats_,
+                                       joule_,       json_,  malady_,         metricsheet_, notifications_,
+                                       preferences_, probe_, processControl_, processes_,   propertyLists_,
+                                       spoor_,       tally_, telem_,          queues_};
     const std::shared_ptr<LocalConnection> connection_ = std::make_shared<LocalConnection>();
     const std::shared_ptr<VelaReportingServiceDelegate> delegate_;
 };

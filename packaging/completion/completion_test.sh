@@ -6,6 +6,8 @@ here=$(dirname -- "$(readlink -f -- "$0")")
 source "$here/velactl"
 # shellcheck source=packaging/completion/vela-reportingd
 source "$here/vela-reportingd"
+# shellcheck source=packaging/completion/vela-pipewire-reporter
+source "$here/vela-pipewire-reporter"
 
 # Without an installed velactl: what `velactl settings --json` begins with.
 # shellcheck disable=SC2317  # the completions call it
@@ -17,6 +19,10 @@ velactl() {
     printf '%s\n' '{"key":"log.target","value":"journal","origin":"default"}' \
         '{"key":"log.level","value":"debug","origin":"file","file":"/x","line":2}'
 }
+
+# Without an installed reporter: what `vela-pipewire-reporter --example` prints.
+# shellcheck disable=SC2317  # the completions call it
+vela-pipewire-reporter() { cat "$here/../pipewire-reporter.toml"; }
 
 status=0
 # offers FUNCTION EXPECTED WORD...: the words so far, the last one being typed; EXPECTED has one space between offers.
@@ -37,7 +43,7 @@ folder=$(mktemp -d)
 trap 'rm -rf -- "$folder"' EXIT
 : >"$folder/one file.toml"
 
-offers _velactl "status sessions call run deliveries defaults notify drivers settings plist --help --version" velactl ""
+offers _velactl "status sessions call run deliveries defaults notify drivers trace settings plist --help --version" velactl ""
 offers _velactl "sessions settings" velactl se
 offers _velactl "createReportingSession" velactl call cr
 offers _velactl "joule" velactl deliveries --backend j
@@ -53,6 +59,12 @@ offers _velactl "--settings --set" velactl settings --set
 offers _velactl "log.target= log.level=" velactl settings --set ""
 offers _velactl "log.level=" velactl settings --set log.l
 offers _velactl "$folder/one file.toml" velactl settings --settings "$folder/o"
+offers _velactl "emit report --help" velactl trace ""
+offers _velactl "" velactl trace emit ""
+offers _velactl "--settings --set" velactl trace emit 0x21040100 --se
+offers _velactl "log.level=" velactl trace emit 1 --set log.l
+offers _velactl "--json" velactl trace report --j
+offers _velactl "$folder/one file.toml" velactl trace report "$folder/o"
 offers _velactl "json xml binary text" velactl plist x --to ""
 offers _velactl "xml" velactl plist x --to x
 offers _velactl "--to" velactl plist --t
@@ -61,4 +73,9 @@ offers _vela_reportingd "--check --json --settings --set --version --help" vela-
 offers _vela_reportingd "--check" vela-reportingd --c
 offers _vela_reportingd "$folder/one file.toml" vela-reportingd --check --settings "$folder/"
 offers _vela_reportingd "log.target=" vela-reportingd --check --set log.t
+offers _vela_pipewire_reporter "--settings --set --check --example --version --help" vela-pipewire-reporter ""
+offers _vela_pipewire_reporter "--example" vela-pipewire-reporter --e
+offers _vela_pipewire_reporter "$folder/one file.toml" vela-pipewire-reporter --settings "$folder/"
+offers _vela_pipewire_reporter "leave_out.applications= leave_out.roles= leave_out.nodes=" vela-pipewire-reporter --set leave
+offers _vela_pipewire_reporter "statistics.folder=" vela-pipewire-reporter --check --set statistics.f
 exit "$status"

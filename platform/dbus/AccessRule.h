@@ -23,6 +23,9 @@ public:
     static AccessRule ofNames(const std::vector<std::string>& users, const std::vector<std::string>& groups,
                               std::vector<std::string>& unknown);
 
+    /// As they were named, those left out that are not known.
+    const std::vector<std::uint32_t>& groups() const { return groups_; }
+
     bool allows(const PeerCredentials& peer) const;
     /// Root or the service's own user.
     static bool isOwner(const PeerCredentials& peer);

@@ -12,7 +12,8 @@ namespace {
 constexpr int kPeerGroupsOption = 59;
 constexpr int kPeerPidfdOption = 77;
 
-std::vector<std::uint32_t> peerGroups(int socket) {
+/// None where the kernel does not tell.
+std::optional<std::vector<std::uint32_t>> peerGroups(int socket) {
     std::vector<std::uint32_t> groups(16);
     while (true) {
         auto bytes = static_cast<socklen_t>(groups.size() * sizeof(std::uint32_t));
@@ -22,7 +23,7 @@ std::vector<std::uint32_t> peerGroups(int socket) {
         }
         const std::size_t needed = bytes / sizeof(std::uint32_t);
         if (errno != ERANGE || needed <= groups.size()) {
-            return {};
+            return std::nullopt;
         }
         groups.resize(needed);
     }
@@ -32,6 +33,10 @@ std::vector<std::uint32_t> peerGroups(int socket) {
 
 bool PeerCredentials::isInGroup(std::uint32_t id) const {
     return group == id || std::find(groups.begin(), groups.end(), id) != groups.end();
+}
+
+std::optional<Identity> PeerCredentials::identity() const {
+    return groupsKnown ? std::optional(Identity{user, group, groups}) : std::nullopt;
 }
 
 Result<PeerCredentials> peerCredentials(int socket) {
@@ -44,7 +49,10 @@ Result<PeerCredentials> peerCredentials(int socket) {
     peer.processIdentifier = credentials.pid;
     peer.user = credentials.uid;
     peer.group = credentials.gid;
-    peer.groups = peerGroups(socket);
+    if (auto groups = peerGroups(socket)) {
+        peer.groups = *std::move(groups);
+        peer.groupsKnown = true;
+    }
     return peer;
 }
 

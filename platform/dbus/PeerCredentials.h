@@ -2,10 +2,12 @@
 // them since. Immutable.
 #pragma once
 
+#include "platform/Identity.h"
 #include "platform/Result.h"
 #include "platform/linux/FileDescriptor.h"
 
 #include <cstdint>
+#include <optional>
 #include <vector>
 
 namespace vela::platform::dbus {
@@ -15,8 +17,11 @@ struct PeerCredentials {
     std::uint32_t user = 0;
     std::uint32_t group = 0;
     std::vector<std::uint32_t> groups; ///< supplementary ones
+    bool groupsKnown = false;          ///< else some may be missing
 
     bool isInGroup(std::uint32_t id) const;
+    /// None while groups may be missing: one that is not known could take rights away as well as give them.
+    std::optional<Identity> identity() const;
 };
 
 Result<PeerCredentials> peerCredentials(int socket);

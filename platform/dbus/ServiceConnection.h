@@ -40,6 +40,7 @@ public:
     explicit ServiceConnection(ConnectionSetup setup);
 
     std::int32_t processIdentifier() const override { return target_.peer.processIdentifier; }
+    std::optional<Identity> peerIdentity() const override { return target_.peer.identity(); }
     void setExportedObject(std::shared_ptr<ReportingServiceProtocol> object) override;
     void setInterruptionHandler(UniqueFunction<void()> handler) override;
     void setInvalidationHandler(UniqueFunction<void()> handler) override;

@@ -29,6 +29,29 @@ TEST(ServiceEndpointLifeTest, ConnectionsAreDescribedByNumbers) {
               "<connection 16 pid " + std::to_string(getpid()) + " uid " + std::to_string(getuid()) + ">");
 }
 
+TEST(ServiceEndpointLifeTest, AConnectionKnowsOnWhoseBehalfItsPeerCalls) {
+    RunningEndpoint endpoint;
+    RawClient client = endpoint.client();
+    endpoint.journal.waitFor(1);
+    std::vector<std::uint32_t> groups(static_cast<std::size_t>(getgroups(0, nullptr)));
+    ASSERT_EQ(getgroups(static_cast<int>(groups.size()), groups.data()), static_cast<int>(groups.size()));
+    std::optional<Identity> identity = endpoint.delegate.lastConnection()->peerIdentity();
+    ASSERT_TRUE(identity);
+    EXPECT_EQ(identity->user, geteuid());
+    EXPECT_EQ(identity->group, getegid());
+    EXPECT_THAT(identity->groups, ::testing::UnorderedElementsAreArray(groups));
+}
+
+TEST(ServiceEndpointLifeTest, WithoutAllOfItsGroupsAPeerIsNotKnown) {
+    PeerCredentials peer;
+    peer.user = 1000;
+    peer.group = 1001;
+    peer.groups = {29};
+    EXPECT_EQ(peer.identity(), std::nullopt);
+    peer.groupsKnown = true;
+    EXPECT_EQ(peer.identity(), (Identity{1000, 1001, {29}}));
+}
+
 TEST(ServiceEndpointLifeTest, TheEndOfTheBytesInvalidatesOnce) {
     RunningEndpoint endpoint;
     RawClient client = endpoint.client();

@@ -1,6 +1,7 @@
 #include "platform/linux/LinuxFileSystem.h"
 
 #include "platform/linux/FileDescriptor.h"
+#include "platform/linux/FileOpening.h"
 
 #include <array>
 #include <cerrno>
@@ -94,6 +95,8 @@ public:
         writeBehind();
     }
 
+    const Failure* failure() const override { return failure_ ? &*failure_ : nullptr; }
+
     Result<Done> commit() override {
         if (failure_) {
             return *failure_;
@@ -175,13 +178,8 @@ Result<Done> createDirectory(const std::string& path, std::uint32_t permissions)
     return Done();
 }
 
-} // namespace
-
-Result<std::string> LinuxFileSystem::readFile(const std::string& path, std::size_t limit) const {
-    if (!isPath(path)) {
-        return failureOf("open", path, EINVAL);
-    }
-    const FileDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+/// All of `file`, which stands at `path`; none is open where that failed with an error number.
+Result<std::string> contentOf(const FileDescriptor& file, const std::string& path, std::size_t limit) {
     struct stat status {};
     if (!file || fstat(file.get(), &status) != 0) {
         return failureOf("open", path, errno);
@@ -199,6 +197,21 @@ Result<std::string> LinuxFileSystem::readFile(const std::string& path, std::size
         return Failure{EFBIG, "read " + path + ": larger than its limit of " + std::to_string(limit) + " bytes"};
     }
     return content;
+}
+
+} // namespace
+
+Result<std::string> LinuxFileSystem::readFile(const std::string& path, std::size_t limit) const {
+    if (!isPath(path)) {
+        return failureOf("open", path, EINVAL);
+    }
+    return contentOf(FileDescriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY)), path, limit);
+}
+
+Result<std::string> LinuxFileSystem::readFileFor(const Identity& reader, const std::string& path,
+                                                 std::size_t limit) const {
+    const Result<FileDescriptor> file = openFor(reader, path);
+    return file ? contentOf(*file, path, limit) : file.failure();
 }
 
 std::unique_ptr<PendingFile> LinuxFileSystem::createFile(const std::string& path, std::uint32_t permissions) {

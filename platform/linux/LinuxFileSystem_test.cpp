@@ -1,4 +1,5 @@
 #include "platform/linux/LinuxFileSystem.h"
+#include "platform/linux/UnprivilegedFileSystem_test.h"
 #include "testing/FileSystemContract.h"
 #include "testing/TemporaryFolder.h"
 
@@ -60,6 +61,7 @@ private:
 };
 
 struct LinuxHarness {
+    LinuxHarness() { std::filesystem::permissions(folder_.path(), std::filesystem::perms{0755}); }
     FileSystem& fileSystem() { return fileSystem_; }
     std::string root() { return folder_.path(); }
     std::optional<std::uint32_t> permissionsOf(const std::string& path) { return permissionsAt(path); }
@@ -71,9 +73,20 @@ struct LinuxHarness {
         }
     }
 
+    bool own(const std::string& path, std::uint32_t user, std::uint32_t group) {
+        return lchown(path.c_str(), user, group) == 0;
+    }
+
     LinuxFileSystem fileSystem_;
     testing::TemporaryFolder folder_;
     std::optional<FileSizeScope> fileSize_;
+};
+
+/// As a service that may not change its user has it.
+struct UnprivilegedHarness : LinuxHarness {
+    FileSystem& fileSystem() { return unprivileged_; }
+
+    UnprivilegedFileSystem unprivileged_{fileSystem_};
 };
 
 } // namespace
@@ -83,6 +96,7 @@ struct LinuxHarness {
 namespace vela::testing {
 
 INSTANTIATE_TYPED_TEST_SUITE_P(Linux, FileSystemContract, platform::LinuxHarness);
+INSTANTIATE_TYPED_TEST_SUITE_P(LinuxUnprivileged, FileSystemContract, platform::UnprivilegedHarness);
 
 } // namespace vela::testing
 

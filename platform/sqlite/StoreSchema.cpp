@@ -89,7 +89,7 @@ std::string allTables() {
     return sql + "CREATE VIEW deliveries AS " + view + ";\n";
 }
 
-struct Identity {
+struct SchemaIdentity {
     std::int64_t version = 0;
     std::int64_t application = 0;
     std::int64_t objects = 0;
@@ -97,7 +97,7 @@ struct Identity {
     bool empty() const { return version == 0 && application == 0 && objects == 0; }
 };
 
-Result<Identity> identify(SqliteDatabase& database, const std::string& path) {
+Result<SchemaIdentity> identify(SqliteDatabase& database, const std::string& path) {
     const auto version = database.integer("PRAGMA user_version");
     if (!version) {
         return database.failure(path + " is left as it is");
@@ -107,7 +107,7 @@ Result<Identity> identify(SqliteDatabase& database, const std::string& path) {
     if (!application || !objects) {
         return database.failure(path + " is left as it is");
     }
-    const Identity identity{*version, *application, *objects};
+    const SchemaIdentity identity{*version, *application, *objects};
     if (!identity.empty() && identity.application != kStoreApplication) {
         return Failure{EINVAL, path + " is a database of something else; it is left as it is"};
     }
@@ -165,7 +165,7 @@ std::span<const StoreMigration> storeMigrations() { return {}; }
 
 Result<Done> prepareSchema(SqliteDatabase& database, const std::string& path,
                            std::span<const StoreMigration> migrations) {
-    const Result<Identity> identity = identify(database, path);
+    const Result<SchemaIdentity> identity = identify(database, path);
     if (!identity) {
         return identity.failure();
     }
@@ -173,7 +173,7 @@ Result<Done> prepareSchema(SqliteDatabase& database, const std::string& path,
 }
 
 Result<Done> checkSchema(SqliteDatabase& database, const std::string& path) {
-    const Result<Identity> identity = identify(database, path);
+    const Result<SchemaIdentity> identity = identify(database, path);
     if (!identity) {
         return identity.failure();
     }
