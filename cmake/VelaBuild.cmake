@@ -72,9 +72,6 @@ function(vela_test name)
   target_link_libraries(${name} PRIVATE vela_options ${arg_LINKS} GTest::gmock GTest::gtest_main)
   # What is tested is built as its preset says; the tests themselves, two thirds of all compile time, need no speed.
   target_compile_options(${name} PRIVATE -O0 -g1)
-  if(VELA_HARDENING)
-    target_compile_options(${name} PRIVATE -U_FORTIFY_SOURCE) # wants optimisation
-  endif()
   # A debug build pays for its checks; the time limit only ends what hangs.
   include(GoogleTest)
   gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT 300 LABELS "${arg_LABELS}")
