@@ -106,7 +106,7 @@ class InstallPackagesTest(unittest.TestCase):
         done = self.run_program("nonsense")
         self.assertEqual((done.returncode, self.calls()), (2, []))
         self.assertEqual(done.stderr, 'install-packages: there is no group "nonsense"; the groups are: '
-                                      "build tests benchmarks sanitizers checks coverage package\n")
+                                      "build pipewire sound tests benchmarks sanitizers checks coverage package\n")
 
 
 if __name__ == "__main__":
