@@ -1,5 +1,7 @@
 #include "benchmarks/ipc/Subject.h"
 
+#include "testing/RunningProgram.h"
+
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
@@ -27,7 +29,7 @@ sockaddr_un addressOf(const std::string& path) {
 
 void require(bool good, const char* what) {
     if (!good) {
-        std::fprintf(stderr, "ipc_benchmark: %s: %s\n", what, std::strerror(errno));
+        std::fprintf(stderr, "benchmark: %s: %s\n", what, std::strerror(errno));
         std::_Exit(EXIT_FAILURE);
     }
 }
@@ -37,7 +39,10 @@ std::string socketPath(const char* name) { return "/tmp/vela-ipc-benchmark-" + s
 int connectedSocket(const std::string& path, int socketType) {
     const int descriptor = socket(AF_UNIX, socketType | SOCK_CLOEXEC, 0);
     const sockaddr_un address = addressOf(path);
-    require(connect(descriptor, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0, "connect");
+    // The file is there somewhat before anybody listens.
+    require(testing::waitUntil(
+                [&] { return connect(descriptor, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0; }),
+            "connect");
     return descriptor;
 }
 

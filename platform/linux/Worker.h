@@ -21,8 +21,10 @@ struct Worker {
     WorkerPool* pool = nullptr;
     const QueueCore* queue = nullptr; // being served
     unsigned blockingDepth = 0;
-    bool inItem = false;   // of a serial queue
-    bool owesWake = false; // the item made a queue ready that this thread serves next, or else wakes another for
+    bool inItem = false; // of a serial queue
+    /// An item made a queue ready: this thread serves it after its own one, or wakes another when it goes on for long.
+    bool owesWake = false;
+    unsigned itemsSince = 0; // of its own queue
     ThreadAppearance appearance;
 };
 

@@ -62,7 +62,8 @@ public:
 
     /// Puts `queue`, which must not be ready already, behind the others of its urgency, and sees to it that a thread
     /// serves it. From inside an item (see `beginItem`) of a queue that is at least as urgent, that is the calling
-    /// thread, when the item has ended: work that is handed from queue to queue in small steps wakes nobody.
+    /// thread, when its queue has no more items: work that is handed from queue to queue in small steps wakes nobody.
+    /// While its queue goes on, another thread is woken after some items.
     void makeReady(PoolLock& lock, std::shared_ptr<QueueCore> queue);
 
     /// `client` must live until its timer has fired or was removed.
