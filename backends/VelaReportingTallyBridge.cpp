@@ -3,7 +3,10 @@
 #include "backends/ApplicationName.h"
 #include "common/VelaReportingUtility.h"
 
+#include <cstddef>
+#include <initializer_list>
 #include <string>
+#include <string_view>
 
 namespace vela {
 
@@ -18,6 +21,20 @@ Dictionary payloadOf(const Dictionary& message, const VelaReportingSession* sess
     return applicationName ? message.setting(VelaReportingApplicationName, std::move(applicationName)) : message;
 }
 
+/// Every message asks for two names: a formatter would take a tenth of its time.
+std::string joined(std::initializer_list<std::string_view> parts) {
+    std::size_t size = 0;
+    for (const std::string_view part : parts) {
+        size += part.size();
+    }
+    std::string text;
+    text.reserve(size);
+    for (const std::string_view part : parts) {
+        text += part;
+    }
+    return text;
+}
+
 } // namespace
 
 void VelaReportingTallyBridge::handleEvent(const Dictionary& message, std::uint32_t category, std::uint32_t type,
@@ -27,9 +44,9 @@ void VelaReportingTallyBridge::handleEvent(const Dictionary& message, std::uint3
     const std::string categoryName = VelaReportingUtilityCategoryString(category);
     const std::string_view typeName = VelaReportingUtilityTypeString(type);
     const std::string eventNames[] = {
-        formatText("com.orvex.vela.%@.%@", categoryName, typeName),
-        formatText("com.orvex.%@.%@.%@", VelaReportingUtilityGenerateServiceNameFromServiceType(serviceType),
-                   categoryName, typeName),
+        joined({"com.orvex.vela.", categoryName, ".", typeName}),
+        joined({"com.orvex.", VelaReportingUtilityGenerateServiceNameFromServiceType(serviceType), ".", categoryName,
+                ".", typeName}),
     };
     for (const std::string& eventName : eventNames) {
         if (tally_.tallyIsEventUsed(eventName)) {

@@ -46,7 +46,7 @@ protected:
     }
 
     const testing::TemporaryFolder folder_;
-    const platform::LinuxClock clock_;
+    platform::LinuxClock clock_;
     platform::LinuxWorkQueues queues_;
     const std::unique_ptr<platform::SerialQueue> queue_ =
         queues_.makeSerialQueue("trace.test", platform::QualityOfService::Default);

@@ -22,9 +22,11 @@ std::optional<std::string> NamePolicy::apply(const std::string& application) con
     switch (treatment_) {
     case NameTreatment::Report:
         return application;
-    case NameTreatment::Hash:
+    case NameTreatment::Hash: {
         // The outer hash keeps a secret of known length from being continued by a chosen name.
-        return "app-" + sha256(secret_ + '\0' + sha256(secret_ + '\0' + application)).substr(0, kDigits);
+        const std::string hash = sha256(secret_ + '\0' + sha256(secret_ + '\0' + application));
+        return hash.empty() ? std::nullopt : std::optional("app-" + hash.substr(0, kDigits));
+    }
     case NameTreatment::Omit:
         break;
     }

@@ -1,4 +1,4 @@
-// The hash function SHA-256 (FIPS 180-4). Pure.
+// The hash function SHA-256.
 #pragma once
 
 #include <string>
@@ -6,7 +6,7 @@
 
 namespace vela::reporter {
 
-/// 64 hexadecimal digits.
+/// 64 hexadecimal digits; none where the system's policy forbids the function.
 std::string sha256(std::string_view bytes);
 
 } // namespace vela::reporter
