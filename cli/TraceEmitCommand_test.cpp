@@ -31,7 +31,7 @@ protected:
         std::ostringstream error;
         Console console{in, out, error};
         const std::string settings = folder_ / "settings.toml";
-        std::ofstream{settings}; // none set
+        const std::ofstream none(settings);
         const std::string set = "paths.runtime=" + folder_.path();
         std::vector<std::string_view> arguments{"trace", "emit", "--settings", settings, "--set", set};
         arguments.insert(arguments.end(), operands.begin(), operands.end());

@@ -41,7 +41,7 @@ public:
         const std::string error = folder_ / "error";
         std::vector<char*> argumentWords = wordsOf(arguments);
         std::vector<char*> environmentWords = wordsOf(environment);
-        pid_ = fork();
+        pid_ = fork(); // NOLINT(cppcoreguidelines-prefer-member-initializer): when everything is prepared
         if (pid_ == 0) {
             constexpr int kPermissions = 0644;
             const int outFile = open(out.c_str(), O_WRONLY | O_CREAT | O_APPEND, kPermissions);
@@ -85,6 +85,7 @@ public:
 private:
     static std::vector<char*> wordsOf(const std::vector<std::string>& texts) {
         std::vector<char*> words;
+        words.reserve(texts.size() + 1);
         for (const std::string& text : texts) {
             words.push_back(const_cast<char*>(text.c_str()));
         }
