@@ -15,6 +15,7 @@
 #include <gtest/gtest.h>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace vela {
@@ -64,7 +65,7 @@ private:
 class RunningService {
 public:
     /// `settings`: further "section.key=value".
-    explicit RunningService(const std::vector<std::string>& settings = {}) : settings_(settings) { start(); }
+    explicit RunningService(std::vector<std::string> settings = {}) : settings_(std::move(settings)) { start(); }
 
     void start() {
         program_.emplace(commandLine(), environment());

@@ -40,7 +40,7 @@ inline ProgramRun runProgram(const std::vector<std::string>& arguments, const st
     }
     command += " </dev/null 2>" + shellWord(folder / "error");
     ProgramRun run;
-    std::FILE* stream = popen(command.c_str(), "r");
+    std::FILE* stream = popen(command.c_str(), "r"); // NOLINT(cert-env33-c): every word is quoted
     if (stream == nullptr) {
         return run;
     }

@@ -39,7 +39,7 @@ void forEachEntry(std::int64_t number, const Add& add) {
 
 /// So that no decoding is left out: what a decoded message must answer.
 inline bool isWhole(const PlainMap& message) {
-    return message.size() == kEntries && std::get<bool>(message.at("spatializationEnabled")) == false &&
+    return message.size() == kEntries && !std::get<bool>(message.at("spatializationEnabled")) &&
            std::get<std::string>(message.at("session_selected_format")).size() == 24;
 }
 
