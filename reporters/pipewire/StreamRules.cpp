@@ -29,7 +29,7 @@ constexpr std::array<RoleRule, 9> kRoles{{{"Music", AudioServiceTypeLongFormAudi
                                           {"Test", AudioServiceTypeSystemSounds},
                                           {"test", AudioServiceTypeSystemSounds}}};
 
-/// Beginnings of the names of sounds that call for a person's attention, as the sound naming specification has them.
+/// Beginnings of the names of sounds that call for a person's attention, as sound themes name them.
 constexpr std::array<std::string_view, 4> kAlerts{"alarm-", "phone-incoming-", "message-", "dialog-"};
 
 constexpr double kVolumeSteps = 1e5;
