@@ -48,9 +48,12 @@ void VelaReportingTallyBridge::handleEvent(const Dictionary& message, std::uint3
         joined({"com.orvex.", VelaReportingUtilityGenerateServiceNameFromServiceType(serviceType), ".", categoryName,
                 ".", typeName}),
     };
+    std::size_t payloadBytes = 0;
     for (const std::string& eventName : eventNames) {
         if (tally_.tallyIsEventUsed(eventName)) {
-            tally_.tallySendEventLazy(eventName, [message, session] { return payloadOf(message, session.get()); });
+            payloadBytes = payloadBytes == 0 ? memoryOf(Value(message)) : payloadBytes;
+            tally_.tallySendEventLazy(
+                eventName, [message, session] { return payloadOf(message, session.get()); }, payloadBytes);
         }
     }
 }

@@ -4,7 +4,9 @@
 #include "common/values/Dictionary.h"
 #include "platform/UniqueFunction.h"
 
+#include <cstddef>
 #include <string_view>
+#include <utility>
 
 namespace vela::platform {
 
@@ -17,8 +19,14 @@ public:
     virtual bool tallyIsEventUsed(std::string_view eventName) = 0;
 
     /// Queues an event. `payload` is called at most once, at a time and on a thread of the service's choosing, possibly
-    /// after this returned, and is destroyed afterwards.
-    virtual void tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload) = 0;
+    /// after this returned, and is destroyed afterwards. `payloadBytes`: about what it holds until then, for bounds.
+    virtual void tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload,
+                                    std::size_t payloadBytes) = 0;
+    /// For a payload of a few values.
+    void tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload) {
+        constexpr std::size_t kFewValues = 512;
+        tallySendEventLazy(eventName, std::move(payload), kFewValues);
+    }
 };
 
 } // namespace vela::platform

@@ -84,7 +84,8 @@ public:
         }
         return used(eventName);
     }
-    void tallySendEventLazy(std::string_view eventName, Builder payload) override {
+    using Tally::tallySendEventLazy;
+    void tallySendEventLazy(std::string_view eventName, Builder payload, std::size_t) override {
         note("send ", eventName);
         if (buildsAtOnce()) {
             Dictionary built = payload();

@@ -173,6 +173,15 @@ Dictionary Dictionary::merging(const Dictionary& other) const {
     return builder.build();
 }
 
+bool Dictionary::hasSameEntries(const Dictionary& other) const {
+    if (object_ == nullptr || other.object_ == nullptr) {
+        return object_ == other.object_;
+    }
+    return hasSameKeysInOrder(other) &&
+           std::equal(object_->kinds(), object_->kinds() + size(), other.object_->kinds()) &&
+           std::equal(object_->payloads(), object_->payloads() + size(), other.object_->payloads());
+}
+
 bool operator==(const Dictionary& left, const Dictionary& right) {
     return detail::equalDictionaries(left.object_, right.object_);
 }

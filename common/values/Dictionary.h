@@ -11,6 +11,7 @@
 #include "common/values/Value.h"
 
 #include <array>
+#include <functional>
 #include <initializer_list>
 #include <iterator>
 #include <memory>
@@ -173,11 +174,16 @@ public:
 
     /// Whether both are the very same object.
     bool isSameObject(const Dictionary& other) const { return object_ == other.object_; }
+    /// Whether both have the same keys in the same order and, bit by bit, the same values: texts and containers are the
+    /// same objects. Then they are written alike; if not, they may still be equal.
+    bool hasSameEntries(const Dictionary& other) const;
     /// Whether both have the same keys in the same order.
     bool hasSameKeysInOrder(const Dictionary& other) const {
         return (object_ == nullptr ? nullptr : object_->shape) ==
                (other.object_ == nullptr ? nullptr : other.object_->shape);
     }
+    /// Equal for dictionaries with the same keys in the same order; good while one of them lives.
+    std::size_t hashOfKeys() const { return std::hash<const void*>()(object_ == nullptr ? nullptr : object_->shape); }
     friend bool operator==(const Dictionary& left, const Dictionary& right);
     /// Equality of what is left of both without the keys `ignored`, which may be absent.
     friend bool equalExcept(const Dictionary& left, const Dictionary& right, std::span<const Key> ignored);

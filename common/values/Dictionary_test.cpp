@@ -172,6 +172,24 @@ TEST(DictionaryTest, OneWithTheSameKeysSharesTheirList) {
     EXPECT_TRUE(first.setting(Key("c"), 3).removing(Key("c")).hasSameKeysInOrder(first));
 }
 
+TEST(DictionaryTest, SameEntriesAreTheSameBitByBit) {
+    const String text("a text that is shared");
+    const Dictionary one{{"a", 1}, {"t", text}};
+    EXPECT_TRUE(one.hasSameEntries(Dictionary{{"a", 1}, {"t", text}}));
+    EXPECT_TRUE(Dictionary().hasSameEntries(Dictionary()));
+    EXPECT_FALSE(one.hasSameEntries(Dictionary()));
+    EXPECT_FALSE(one.hasSameEntries(Dictionary{{"t", text}, {"a", 1}}));
+    EXPECT_FALSE(one.hasSameEntries(Dictionary{{"a", 2}, {"t", text}}));
+    EXPECT_FALSE(one.hasSameEntries(Dictionary{{"a", true}, {"t", text}}));
+    EXPECT_FALSE((Dictionary{{"a", 0.0}}).hasSameEntries(Dictionary{{"a", -0.0}}));
+}
+
+TEST(DictionaryTest, TheSameKeysHaveTheSameHash) {
+    const Dictionary one{{"a", 1}, {"b", 2}};
+    EXPECT_EQ(one.hashOfKeys(), (Dictionary{{"a", "x"}, {"b", "y"}}).hashOfKeys());
+    EXPECT_EQ(Dictionary().hashOfKeys(), Dictionary().hashOfKeys());
+}
+
 TEST(DictionaryTest, EqualityCanIgnoreKeys) {
     const std::vector<Key> ignored = {Key("time"), Key("uptime")};
     const Dictionary message = {{"time", 1}, {"a", 1}, {"b", "two"}};

@@ -36,7 +36,8 @@ public:
 class AbsentTally final : public Tally {
 public:
     bool tallyIsEventUsed(std::string_view) override { return false; }
-    void tallySendEventLazy(std::string_view, UniqueFunction<Dictionary()>) override {}
+    void tallySendEventLazy(std::string_view, UniqueFunction<Dictionary()>, std::size_t) override {}
+    using Tally::tallySendEventLazy;
 };
 
 /// Events are dropped.

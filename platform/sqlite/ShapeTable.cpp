@@ -33,11 +33,9 @@ Dictionary keysOnly(const Dictionary& payload) {
 
 std::size_t ShapeTable::Hash::operator()(const Wanted& wanted) const {
     constexpr std::size_t kFactor = 0x9E3779B97F4A7C15;
-    std::size_t hash = std::hash<std::string_view>()(wanted.name.view()) + static_cast<std::size_t>(wanted.backend) + 1;
-    for (const auto& [key, value] : wanted.payload) {
-        hash = (hash ^ key.object()->hash) * kFactor;
-    }
-    return hash;
+    const std::size_t hash =
+        std::hash<std::string_view>()(wanted.name.view()) + static_cast<std::size_t>(wanted.backend) + 1;
+    return (hash ^ wanted.payload.hashOfKeys()) * kFactor;
 }
 
 ShapeTable::ShapeTable(SqliteDatabase& database, const Bounds& bounds) : database_(database), bounds_(bounds) {}

@@ -30,9 +30,13 @@ int errorNumberOf(sqlite3* database) {
     }
 }
 
+// SQLite counts its memory, under a lock, for those who ask. Nobody does here.
+void configureOnce() { [[maybe_unused]] static const int done = sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0); }
+
 } // namespace
 
 Result<SqliteDatabase> SqliteDatabase::open(const std::string& path, Access access, const std::string& vfs) {
+    configureOnce();
     const int flags = (access == Access::ReadOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE) | SQLITE_OPEN_NOMUTEX;
     sqlite3* handle = nullptr;
     const int code = sqlite3_open_v2(path.c_str(), &handle, flags, vfs.empty() ? nullptr : vfs.c_str());

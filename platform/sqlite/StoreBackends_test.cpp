@@ -151,6 +151,18 @@ TEST_F(StoreBackendsTest, NothingIsThereBeforeTheCommit) {
     EXPECT_THAT(query("SELECT backend FROM deliveries"), ElementsAre("telem"));
 }
 
+TEST_F(StoreBackendsTest, WhatAPayloadHoldsCountsBeforeItIsBuilt) {
+    StoreTally tally(*store_, {"*"});
+    const LedgerScope scope(entry_);
+    // Nothing of so many bytes has room beside anything else.
+    tally.tallySendEventLazy(
+        "a", [] { return Dictionary(); }, 32 * 1024 * 1024);
+    EXPECT_EQ(dropped(entry_, DeliveryBackend::Tally, DropReason::QueueFull), 1U);
+    tally.tallySendEventLazy("a", [] { return Dictionary(); });
+    ASSERT_TRUE(store_->commitAll());
+    EXPECT_EQ(entry_->counts(DeliveryBackend::Tally).delivered, 1U);
+}
+
 } // namespace
 
 } // namespace vela::platform

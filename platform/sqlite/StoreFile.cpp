@@ -175,7 +175,11 @@ Failure StoreFile::rollBack() {
 }
 
 bool StoreFile::insertAll(std::span<StoreRecord> records, StoredDeliveries& deliveries) {
-    return std::ranges::all_of(records, [&](StoreRecord& record) { return insert(record, deliveries); });
+    const bool inserted =
+        std::ranges::all_of(records, [&](StoreRecord& record) { return insert(record, deliveries); }) &&
+        std::ranges::all_of(tables_, [](StoreTable& table) { return table.writeRows(); });
+    encoded_ = Dictionary();
+    return inserted;
 }
 
 bool StoreFile::insert(StoreRecord& record, StoredDeliveries& deliveries) {
@@ -199,7 +203,13 @@ bool StoreFile::insert(StoreRecord& record, StoredDeliveries& deliveries) {
     return true;
 }
 
+// The two analytics events of a message say the same and come one behind the other.
 std::string_view StoreFile::encode(const Dictionary& payload, bool withKeys) {
+    if (payload.hasSameEntries(encoded_) && withKeys == encodedWithKeys_ && !payload.empty()) {
+        return values_;
+    }
+    encoded_ = payload;
+    encodedWithKeys_ = withKeys;
     values_.clear();
     if (withKeys) {
         appendJson(values_, Value(payload));

@@ -90,6 +90,8 @@ private:
     std::int64_t usedPages_ = 0;
     std::int64_t logPages_ = 0; ///< that the log holds since it began anew
     std::string values_;        ///< kept for its memory
+    Dictionary encoded_;        ///< whose text values_ is; while a group is inserted
+    bool encodedWithKeys_ = false;
 };
 
 } // namespace vela::platform

@@ -234,6 +234,41 @@ TEST_F(StoreFileTest, LargeRecordsStayBelowTheBoundToo) {
     expectAccountsToHold();
 }
 
+TEST_F(StoreFileTest, EveryRowOfAGroupIsStoredWhateverItsSize) {
+    const auto file = openFile(64 * kMiB);
+    std::int64_t stored = 0;
+    for (const std::int64_t size : {1, 15, 16, 17, 31, 32, 33, 100}) {
+        std::vector<StoreRecord> group;
+        for (std::int64_t number = 0; number < size; ++number) {
+            // Two back ends in turns, so that both collect rows at the same time.
+            const auto backend = number % 3 == 0 ? DeliveryBackend::Beacon : DeliveryBackend::Tally;
+            group.push_back(record(backend, {{"number", stored + number}}));
+        }
+        store(*file, group);
+        stored += size;
+    }
+    const auto rows = queryRows(options_.file.path, "SELECT seq, payload FROM deliveries ORDER BY seq");
+    ASSERT_EQ(rows.size(), 245U);
+    for (std::size_t row = 0; row < rows.size(); ++row) {
+        EXPECT_EQ(rows[row], std::to_string(row + 1) + "|{\"number\":" + std::to_string(row) + "}");
+    }
+}
+
+TEST_F(StoreFileTest, RowsThatSayTheSameAreStoredEachUnderItsName) {
+    const auto file = openFile(64 * kMiB);
+    const Dictionary payload{{"a", 1}, {"b", "text"}};
+    std::vector<StoreRecord> group;
+    for (const char* const name : {"one", "two"}) {
+        group.push_back(record(DeliveryBackend::Tally, payload.setting(Key("c"), 2.5)));
+        group.back().name = String(name);
+    }
+    group.push_back(record(DeliveryBackend::Tally, payload));
+    store(*file, group);
+    EXPECT_THAT(queryRows(options_.file.path, "SELECT name, payload FROM deliveries ORDER BY seq"),
+                ElementsAre(R"(one|{"a":1,"b":"text","c":2.5})", R"(two|{"a":1,"b":"text","c":2.5})",
+                            R"(NULL|{"a":1,"b":"text"})"));
+}
+
 } // namespace
 
 } // namespace vela::platform

@@ -21,7 +21,7 @@ namespace vela::platform {
 class StoreQueue {
 public:
     struct Limits {
-        std::size_t records = 16'384;
+        std::size_t records = 65'536;
         std::size_t bytes = 32 * 1024 * 1024;
         std::size_t group = 64; ///< records that are committed together
     };

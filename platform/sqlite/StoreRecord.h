@@ -61,6 +61,7 @@ struct StoreRecord {
 
     /// Makes the payload on the writer's thread, called once at the most.
     UniqueFunction<Dictionary()> builder;
+    std::size_t builderBytes = 0; ///< about what it holds, and what the payload will
     /// Called on the writer's thread with what became of the record.
     UniqueFunction<void(bool stored)> done;
     /// Whose outcome is counted; null for marks.
@@ -71,11 +72,10 @@ struct StoreRecord {
     std::optional<DropReason> refused; ///< why it is not stored although its group is
 };
 
-/// Bytes that a record holds while it waits. What a builder holds is nobody's to know, so it counts for a fixed number.
+/// Bytes that a record holds while it waits.
 inline std::size_t weightOf(const StoreRecord& record) {
-    constexpr std::size_t kBuilder = 4096;
     return sizeof(StoreRecord) + record.name.view().size() + record.bytes.size() + memoryOf(Value(record.payload)) +
-           (record.builder ? kBuilder : 0);
+           record.builderBytes;
 }
 
 } // namespace vela::platform

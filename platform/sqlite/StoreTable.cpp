@@ -8,17 +8,36 @@ namespace vela::platform {
 
 namespace {
 
+constexpr std::size_t kColumns = 11; // of a row
+
 std::int64_t microseconds(WallTime time) {
     return std::chrono::floor<std::chrono::microseconds>(time.time_since_epoch()).count();
 }
 
+/// Whether the row says its name itself; else its shape does.
+bool isNamed(const StoreRecord& record, std::int64_t shape) { return shape == 0 && !record.name.view().empty(); }
+
 } // namespace
+
+// "OR FAIL": without it SQLite notes for each statement how to take it back, and a failure takes back the whole
+// transaction anyway.
+SqliteStatement StoreTable::prepareInsert(std::size_t rows) {
+    std::string sql = "INSERT OR FAIL INTO " + std::string(nameOf(backend_)) +
+                      "(seq, ts, session, operation, category, type, shape, name, number, vals, record) VALUES";
+    for (std::size_t row = 0; row < rows; ++row) {
+        sql += row == 0 ? "(?" : ",(?";
+        for (std::size_t column = 1; column < kColumns; ++column) {
+            sql += ",?";
+        }
+        sql += ')';
+    }
+    return database_->prepare(sql);
+}
 
 bool StoreTable::load() {
     const std::string name(nameOf(backend_));
-    insert_ = database_->prepare("INSERT INTO " + name +
-                                 "(seq, ts, session, operation, category, type, shape, name, number, vals, record) "
-                                 "VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11)");
+    insert_ = prepareInsert(1);
+    insertTogether_ = prepareInsert(kRowsTogether);
     oldest_ = database_->prepare("SELECT seq, operation, vals, name, record FROM " + name + " ORDER BY seq");
     delete_ = database_->prepare("DELETE FROM " + name + " WHERE seq <= ?1");
     account_ = database_->prepare("UPDATE backend SET rows = ?1, bytes = ?2, evicted = ?3, evicted_marks = ?4, "
@@ -26,7 +45,7 @@ bool StoreTable::load() {
     SqliteStatement read = database_->prepare(
         "SELECT rows, bytes, evicted, evicted_marks, last_evicted, (SELECT coalesce(max(seq), 0) FROM " + name +
         ") FROM backend WHERE backend = ?1");
-    if (!insert_ || !oldest_ || !delete_ || !account_ || !read) {
+    if (!insert_ || !insertTogether_ || !oldest_ || !delete_ || !account_ || !read) {
         return false;
     }
     read.bind(1, static_cast<std::int64_t>(backend_));
@@ -52,32 +71,61 @@ std::int64_t StoreTable::rowBytes(std::size_t values, std::size_t name, std::siz
 }
 
 bool StoreTable::insert(const StoreRecord& record, const StoreRow& row) {
-    const bool named = row.shape == 0 && !record.name.view().empty();
-    insert_.bind(1, row.seq);
-    insert_.bind(2, microseconds(record.time));
-    insert_.bind(3, record.session);
-    insert_.bind(4, static_cast<std::int64_t>(record.operation));
-    insert_.bind(5, record.category);
-    insert_.bind(6, record.type);
-    insert_.bind(7, row.shape == 0 ? std::nullopt : std::optional(row.shape));
-    if (named) {
-        insert_.bindText(8, record.name.view());
-    } else {
-        insert_.bindNull(8);
-    }
-    insert_.bind(9, record.number);
-    insert_.bindText(10, row.values);
-    if (record.operation == StoreOperation::Post) {
-        insert_.bindBytes(11, record.bytes);
-    } else {
-        insert_.bindNull(11);
-    }
-    if (!insert_.run()) {
-        return false;
-    }
+    const std::size_t begin = waitingValues_.size();
+    waitingValues_ += row.values;
+    waiting_.push_back({&record, row.seq, row.shape, begin, waitingValues_.size()});
     ++usage_.rows;
-    usage_.bytes += rowBytes(row.values.size(), named ? record.name.view().size() : 0, record.bytes.size());
-    return true;
+    usage_.bytes +=
+        rowBytes(row.values.size(), isNamed(record, row.shape) ? record.name.view().size() : 0, record.bytes.size());
+    return waiting_.size() < kRowsTogether || writeRows();
+}
+
+bool StoreTable::writeRows() {
+    bool written = true;
+    if (waiting_.size() == kRowsTogether) {
+        for (std::size_t place = 0; place < kRowsTogether; ++place) {
+            bind(insertTogether_, place, waiting_[place]);
+        }
+        written = insertTogether_.run();
+    } else {
+        for (const WaitingRow& row : waiting_) {
+            bind(insert_, 0, row);
+            written = written && insert_.run();
+        }
+    }
+    waiting_.clear();
+    waitingValues_.clear();
+    return written;
+}
+
+void StoreTable::rolledBack() {
+    usage_ = kept_;
+    waiting_.clear();
+    waitingValues_.clear();
+}
+
+void StoreTable::bind(SqliteStatement& statement, std::size_t place, const WaitingRow& row) {
+    const StoreRecord& record = *row.record;
+    int column = static_cast<int>(place * kColumns);
+    statement.bind(++column, row.seq);
+    statement.bind(++column, microseconds(record.time));
+    statement.bind(++column, record.session);
+    statement.bind(++column, static_cast<std::int64_t>(record.operation));
+    statement.bind(++column, record.category);
+    statement.bind(++column, record.type);
+    statement.bind(++column, row.shape == 0 ? std::nullopt : std::optional(row.shape));
+    if (isNamed(record, row.shape)) {
+        statement.bindText(++column, record.name.view());
+    } else {
+        statement.bindNull(++column);
+    }
+    statement.bind(++column, record.number);
+    statement.bindText(++column, std::string_view(waitingValues_).substr(row.begin, row.end - row.begin));
+    if (record.operation == StoreOperation::Post) {
+        statement.bindBytes(++column, record.bytes);
+    } else {
+        statement.bindNull(++column);
+    }
 }
 
 bool StoreTable::evict(std::int64_t bytes) {

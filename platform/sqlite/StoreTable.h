@@ -4,8 +4,11 @@
 #include "platform/sqlite/SqliteDatabase.h"
 #include "platform/sqlite/StoreRecord.h"
 
+#include <cstddef>
 #include <cstdint>
+#include <string>
 #include <string_view>
+#include <vector>
 
 namespace vela::platform {
 
@@ -42,7 +45,9 @@ public:
     /// What a row counts for: about what it takes in the file, its entry in the index included.
     static std::int64_t rowBytes(std::size_t values, std::size_t name, std::size_t bytes);
 
+    /// Takes a row, which is written with others: by `writeRows`, or earlier when many wait. `record` lives until then.
     [[nodiscard]] bool insert(const StoreRecord& record, const StoreRow& row);
+    [[nodiscard]] bool writeRows();
     /// Deletes the oldest rows until `bytes` are freed or none is left.
     [[nodiscard]] bool evict(std::int64_t bytes);
 
@@ -50,18 +55,35 @@ public:
     /// Writes the account when it changed.
     [[nodiscard]] bool writeUsage();
     void committed() { kept_ = usage_; }
-    void rolledBack() { usage_ = kept_; }
+    void rolledBack();
 
 private:
+    /// Rows that one statement writes: a statement by itself costs as much as some rows.
+    static constexpr std::size_t kRowsTogether = 16;
+
+    struct WaitingRow {
+        const StoreRecord* record = nullptr;
+        std::int64_t seq = 0;
+        std::int64_t shape = 0;
+        std::size_t begin = 0; ///< of its values in waitingValues_
+        std::size_t end = 0;
+    };
+
+    SqliteStatement prepareInsert(std::size_t rows);
+    void bind(SqliteStatement& statement, std::size_t place, const WaitingRow& row);
+
     SqliteDatabase* database_;
     DeliveryBackend backend_;
     SqliteStatement insert_;
+    SqliteStatement insertTogether_;
     SqliteStatement oldest_;
     SqliteStatement delete_;
     SqliteStatement account_;
     StoreUsage usage_;
     StoreUsage kept_; ///< as the last commit left it
     std::int64_t newest_ = 0;
+    std::vector<WaitingRow> waiting_;
+    std::string waitingValues_;
 };
 
 } // namespace vela::platform

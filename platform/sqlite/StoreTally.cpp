@@ -22,24 +22,31 @@ bool StoreTally::tallyIsEventUsed(std::string_view eventName) {
     return false;
 }
 
-void StoreTally::tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload) {
+void StoreTally::tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload,
+                                    std::size_t payloadBytes) {
     StoreRecord record = store_.newDelivery(DeliveryBackend::Tally, StoreOperation::Send);
     record.name = find(eventName).text;
     record.builder = std::move(payload);
+    record.builderBytes = payloadBytes;
     store_.add(std::move(record));
 }
 
 StoreTally::Name StoreTally::find(std::string_view eventName) {
     const MutexLock lock(mutex_);
-    if (const auto found = names_.find(eventName); found != names_.end()) {
-        return found->second;
+    if (last_ != nullptr && last_->first == eventName) {
+        return last_->second;
     }
-    if (names_.size() >= kMostNames) {
-        names_.clear();
+    auto found = names_.find(eventName);
+    if (found == names_.end()) {
+        if (names_.size() >= kMostNames) {
+            names_.clear();
+        }
+        std::string text(eventName);
+        Name name{String(eventName), matches(text)};
+        found = names_.emplace(std::move(text), std::move(name)).first;
     }
-    std::string text(eventName);
-    Name name{String(eventName), matches(text)};
-    return names_.emplace(std::move(text), std::move(name)).first->second;
+    last_ = &*found;
+    return found->second;
 }
 
 bool StoreTally::matches(const std::string& eventName) const {

@@ -11,6 +11,7 @@
 #include <string>
 #include <string_view>
 #include <unordered_map>
+#include <utility>
 #include <vector>
 
 namespace vela::platform {
@@ -25,7 +26,9 @@ public:
 
     /// An event that nobody uses is counted as received and dropped.
     bool tallyIsEventUsed(std::string_view eventName) override;
-    void tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload) override;
+    void tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload,
+                            std::size_t payloadBytes) override;
+    using Tally::tallySendEventLazy;
 
 private:
     struct Name {
@@ -44,6 +47,8 @@ private:
     const std::vector<std::string> patterns_;
     Mutex mutex_;
     std::unordered_map<std::string, Name, TextHash, std::equal_to<>> names_ VELA_GUARDED_BY(mutex_);
+    /// The one asked for last, which is asked for twice; null for none.
+    const std::pair<const std::string, Name>* last_ VELA_GUARDED_BY(mutex_) = nullptr;
 };
 
 } // namespace vela::platform
