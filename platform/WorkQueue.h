@@ -16,7 +16,8 @@
 
 namespace vela::platform {
 
-/// How urgent a queue's work is, most urgent first. Bindings map it to thread priority where they may.
+/// How urgent a queue's work is, most urgent first. Bindings map it to thread priority where they may, for work that
+/// goes on for some time.
 enum class QualityOfService : std::uint8_t { UserInteractive, Default, Utility, Background };
 
 using WorkItem = UniqueFunction<void()>;

@@ -1,3 +1,4 @@
+#include "platform/linux/DeferredWakes.h"
 #include "platform/linux/LinuxWorkQueues.h"
 #include "platform/linux/WorkQueueTestTools.h"
 #include "testing/Record.h"
@@ -195,13 +196,50 @@ TEST(LinuxWorkQueuesQualityTest, ABusyQueueLetsItsEqualsHaveTheirTurn) {
     EXPECT_EQ(record.numbers()[63], 2); // the gate and 63 items were the busy queue's share
 }
 
+TEST(LinuxWorkQueuesQualityTest, AFewItemsOfALessUrgentQueueRunAtTheThreadsOwnNiceValue) {
+    LinuxWorkQueues queues(1);
+    const int base = threadNice();
+    std::promise<int> nice;
+    const auto queue = queues.makeSerialQueue("queue", QualityOfService::Utility);
+    queue->post([&nice] { nice.set_value(threadNice()); });
+    EXPECT_EQ(nice.get_future().get(), base);
+}
+
+TEST(LinuxWorkQueuesQualityTest, AnItemThatBlockedHasTheNiceValueOfItsQueue) {
+    LinuxWorkQueues queues(1);
+    std::promise<int> nice;
+    const auto queue = queues.makeSerialQueue("queue", QualityOfService::Utility);
+    queue->post([&] {
+        { const BlockingScope blocking(queues); }
+        nice.set_value(threadNice());
+    });
+    const int base = threadNice();
+    EXPECT_EQ(nice.get_future().get(),
+              queues.appliesThreadPriorities() ? niceFor(QualityOfService::Utility, base) : base);
+}
+
+TEST(LinuxWorkQueuesQualityTest, TheBackgroundsItemsHaveItsNiceValueFromTheFirstOn) {
+    LinuxWorkQueues queues(1);
+    std::promise<int> nice;
+    queues.background().post([&nice] { nice.set_value(threadNice()); });
+    const int base = threadNice();
+    EXPECT_EQ(nice.get_future().get(),
+              queues.appliesThreadPriorities() ? niceFor(QualityOfService::Background, base) : base);
+}
+
 TEST(LinuxWorkQueuesQualityTest, ThreadsTakeOnTheNiceValueOfTheirQueueWhereTheyMay) {
     LinuxWorkQueues queues(1);
     const int base = threadNice();
     const auto niceIn = [&queues](QualityOfService quality) {
         std::promise<int> nice;
+        Gate gate;
         const auto queue = queues.makeSerialQueue("queue", quality);
+        queue->post(gate.item());
+        for (int i = 0; i < 15; ++i) {
+            queue->post([] {});
+        }
         queue->post([&nice] { nice.set_value(threadNice()); });
+        gate.open();
         return nice.get_future().get();
     };
     const auto expected = [&](QualityOfService quality) {
@@ -212,6 +250,37 @@ TEST(LinuxWorkQueuesQualityTest, ThreadsTakeOnTheNiceValueOfTheirQueueWhereTheyM
         EXPECT_EQ(niceIn(quality), expected(quality));
     }
     EXPECT_EQ(threadNice(), base);
+}
+
+TEST(LinuxWorkQueuesQualityTest, WhatIsPostedWhileWakesAreDeferredRunsAfterwards) {
+    std::atomic<int> ran = 0;
+    LinuxWorkQueues queues(4);
+    std::vector<std::unique_ptr<SerialQueue>> all;
+    for (int i = 0; i < 20; ++i) {
+        all.push_back(queues.makeSerialQueue("queue", QualityOfService::Default));
+    }
+    for (int round = 0; round < 200; ++round) {
+        const DeferredWakes wakes;
+        for (const auto& queue : all) {
+            queue->post([&ran] { ++ran; });
+        }
+    }
+    EXPECT_TRUE(waitFor([&ran] { return ran == 4'000; }));
+}
+
+TEST(LinuxWorkQueuesQualityTest, AThreadThatSleepsIsWokenWhenTheDeferringEnds) {
+    std::promise<void> first;
+    std::promise<void> second;
+    LinuxWorkQueues queues(1);
+    const auto queue = queues.makeSerialQueue("queue", QualityOfService::Default);
+    queue->post([&first] { first.set_value(); });
+    first.get_future().get();
+    {
+        const DeferredWakes outer;
+        const DeferredWakes inner;
+        queue->post([&second] { second.set_value(); });
+    }
+    EXPECT_EQ(second.get_future().wait_for(60s), std::future_status::ready);
 }
 
 } // namespace

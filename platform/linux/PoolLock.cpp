@@ -1,5 +1,6 @@
 #include "platform/linux/PoolLock.h"
 
+#include "platform/linux/DeferredWakes.h"
 #include "platform/linux/Worker.h"
 #include "platform/linux/WorkerPool.h"
 
@@ -33,7 +34,7 @@ void PoolLock::wakeOnUnlock(Worker& worker) {
 
 void PoolLock::wakeNow() {
     for (; wakeCount_ > 0; --wakeCount_) {
-        wakes_[wakeCount_ - 1]->wake.notify_one();
+        DeferredWakes::wake(wakes_[wakeCount_ - 1]->wake);
     }
 }
 

@@ -25,6 +25,7 @@ struct Worker {
     /// An item made a queue ready: this thread serves it after its own one, or wakes another when it goes on for long.
     bool owesWake = false;
     unsigned itemsSince = 0; // of its own queue
+    unsigned itemsInTurn = 0;
     ThreadAppearance appearance;
 };
 

@@ -21,6 +21,10 @@ constexpr Nanoseconds kKeepSurplus = 2s;
 /// microseconds' worth, so that many small steps share one wake-up.
 constexpr unsigned kItemsUnshared = 16;
 
+/// How many items of a less urgent queue run before the thread takes on its priority: to change it and change it back
+/// would cost as much as a few small items.
+constexpr unsigned kItemsAtOldPriority = 16;
+
 constinit thread_local Worker* currentWorker = nullptr;
 
 } // namespace
@@ -83,6 +87,9 @@ bool WorkerPool::servesNext(const QueueCore& queue) const {
 void WorkerPool::beginItem() {
     Worker& self = *currentWorker;
     self.inItem = true;
+    if (++self.itemsInTurn == kItemsAtOldPriority) {
+        adoptPriority(self);
+    }
     if (self.owesWake && ++self.itemsSince == kItemsUnshared) {
         self.owesWake = false;
         PoolLock lock(*this);
@@ -114,6 +121,7 @@ void WorkerPool::beginBlocking(PoolLock& lock) {
     }
     if (self->queue != nullptr) {
         self->appearance.adopt(self->queue->threadName());
+        adoptPriority(*self);
     }
     --active_;
     ++blocked_;
@@ -197,6 +205,7 @@ bool WorkerPool::serveNext(PoolLock& lock, Worker& self) {
     lock.unlock();
     prepare(self, *queue);
     self.queue = queue.get();
+    self.itemsInTurn = 0;
     const bool again = queue->runTurn();
     assert(self.blockingDepth == 0);
     self.queue = nullptr;
@@ -261,10 +270,18 @@ bool WorkerPool::takeOffBackgroundPriority(PoolLock& lock, Worker& self) {
     return true;
 }
 
+/// An urgent queue's priority is taken on at once, and so is the background's, whose items may be long.
 void WorkerPool::prepare(Worker& self, const QueueCore& queue) const {
-    if (appliesPriorities_) {
-        self.appearance.adopt(niceFor(queue.quality(), baseNice_));
+    if (queue.quality() == QualityOfService::Background || niceOf(queue) < self.appearance.nice()) {
+        self.appearance.adopt(niceOf(queue));
     }
+}
+
+/// That of the queue that the thread serves.
+void WorkerPool::adoptPriority(Worker& self) const { self.appearance.adopt(niceOf(*self.queue)); }
+
+int WorkerPool::niceOf(const QueueCore& queue) const {
+    return appliesPriorities_ ? niceFor(queue.quality(), baseNice_) : baseNice_;
 }
 
 void WorkerPool::fireDueTimers(PoolLock& lock) {

@@ -117,6 +117,8 @@ private:
     bool rest(PoolLock& lock, Worker& self);
     bool takeOffBackgroundPriority(PoolLock& lock, Worker& self);
     void prepare(Worker& self, const QueueCore& queue) const;
+    void adoptPriority(Worker& self) const;
+    int niceOf(const QueueCore& queue) const;
     void fireDueTimers(PoolLock& lock);
     void wakeForWork(PoolLock& lock);
     void wakeForTimers(PoolLock& lock);
