@@ -3,7 +3,6 @@
 #include "platform/dbus/Authentication.h"
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <chrono>
 #include <cstring>
@@ -60,11 +59,10 @@ Result<Done> BlockingConnection::authenticate(Nanoseconds patience) {
             authenticated_ = true;
             return takeApart();
         }
-        if (const Result<Done> ready = waitFor(POLLIN, patience); !ready) {
-            return Failure{0, "the service did not answer: " + ready.failure().description};
-        }
-        if (const Result<Done> taken = takeIn(); !taken) {
-            return taken.failure();
+        if (const Result<Done> taken = takeIn(patience); !taken) {
+            return taken.failure().code == ETIMEDOUT
+                       ? Failure{0, "the service did not answer: " + taken.failure().description}
+                       : taken.failure();
         }
     }
 }
@@ -85,7 +83,7 @@ Result<Done> BlockingConnection::send(std::string_view bytes) {
         // A service that stops reading until its replies are read must not meet a client that does the same.
         pollfd waiting{descriptor_.get(), POLLIN | POLLOUT, 0};
         if (::poll(&waiting, 1, -1) > 0 && (waiting.revents & POLLIN) != 0) {
-            Result<Done> taken = takeIn();
+            Result<Done> taken = takeWhatIsThere();
             if (taken && authenticated_) {
                 taken = takeApart();
             }
@@ -102,10 +100,7 @@ Result<Reply> BlockingConnection::receive(std::uint32_t serial, Nanoseconds pati
         if (auto found = replies_.extract(serial)) {
             return std::move(found.mapped());
         }
-        if (const Result<Done> ready = waitFor(POLLIN, patience); !ready) {
-            return ready.failure();
-        }
-        Result<Done> taken = takeIn();
+        Result<Done> taken = takeIn(patience);
         if (taken) {
             taken = takeApart();
         }
@@ -115,39 +110,47 @@ Result<Reply> BlockingConnection::receive(std::uint32_t serial, Nanoseconds pati
     }
 }
 
-Result<Done> BlockingConnection::waitFor(short events, Nanoseconds patience) {
-    const auto deadline = std::chrono::steady_clock::now() + patience;
-    for (;;) {
-        const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
-        if (left.count() < 0) {
-            return Failure{ETIMEDOUT, "no answer within " +
-                                          std::to_string(std::chrono::duration<double>(patience).count()) + " seconds"};
-        }
-        pollfd waiting{descriptor_.get(), events, 0};
-        const int ready = ::poll(&waiting, 1, static_cast<int>(std::min<std::int64_t>(left.count(), 1'000'000)));
-        if (ready > 0) {
-            return Done();
-        }
-        if (ready < 0 && errno != EINTR) {
+// Waits for bytes, in one call of the system: a waiting client's time is spent in those.
+Result<Done> BlockingConnection::takeIn(Nanoseconds patience) {
+    if (patience != patience_) {
+        // No time at all would mean for ever.
+        const auto time =
+            std::max(std::chrono::ceil<std::chrono::microseconds>(patience), std::chrono::microseconds(1));
+        const auto seconds = std::chrono::floor<std::chrono::seconds>(time);
+        const timeval limit{seconds.count(), (time - seconds).count()};
+        if (setsockopt(descriptor_.get(), SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof(limit)) != 0) {
             return systemFailure("waiting for the service", errno);
         }
+        patience_ = patience;
     }
+    ssize_t got = -1;
+    do {
+        got = ::recv(descriptor_.get(), scratch_.data(), scratch_.size(), 0);
+    } while (got < 0 && errno == EINTR);
+    if (got < 0 && errno == EAGAIN) {
+        return Failure{ETIMEDOUT, "no answer within " +
+                                      std::to_string(std::chrono::duration<double>(patience).count()) + " seconds"};
+    }
+    return keep(got);
 }
 
-// Reads what is there.
-Result<Done> BlockingConnection::takeIn() {
-    std::array<char, 16384> buffer; // NOLINT(*-member-init): written before it is read
-    const ssize_t got = ::recv(descriptor_.get(), buffer.data(), buffer.size(), MSG_DONTWAIT);
-    if (got > 0) {
-        received_.append(buffer.data(), static_cast<std::size_t>(got));
+Result<Done> BlockingConnection::takeWhatIsThere() {
+    const ssize_t got = ::recv(descriptor_.get(), scratch_.data(), scratch_.size(), MSG_DONTWAIT);
+    if (got < 0 && (errno == EAGAIN || errno == EINTR)) {
         return Done();
     }
-    if (got == 0 || errno == ECONNRESET) {
+    return keep(got);
+}
+
+// `got`: what a reading into scratch_ answered.
+Result<Done> BlockingConnection::keep(ssize_t got) {
+    if (got == 0 || (got < 0 && errno == ECONNRESET)) {
         return closedFailure();
     }
-    if (errno != EAGAIN && errno != EINTR) {
+    if (got < 0) {
         return systemFailure("reading from the service", errno);
     }
+    received_.append(scratch_.data(), static_cast<std::size_t>(got));
     return Done();
 }
 

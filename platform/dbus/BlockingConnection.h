@@ -51,13 +51,18 @@ private:
     explicit BlockingConnection(FileDescriptor descriptor) : descriptor_(std::move(descriptor)) {}
 
     Result<Done> authenticate(Nanoseconds patience);
-    Result<Done> waitFor(short events, Nanoseconds patience);
-    Result<Done> takeIn();
+    Result<Done> takeIn(Nanoseconds patience);
+    Result<Done> takeWhatIsThere();
+    Result<Done> keep(ssize_t got);
     Result<Done> takeApart();
 
+    static constexpr std::size_t kReadBytes = 16 * 1024;
+
     FileDescriptor descriptor_;
+    Nanoseconds patience_{-1};   ///< of the socket, for what comes in; none at first
     bool authenticated_ = false; ///< what comes in are messages
     std::uint32_t serial_ = 0;
+    std::vector<char> scratch_ = std::vector<char>(kReadBytes); ///< what a reading fills
     std::string received_;
     std::map<std::uint32_t, Reply> replies_;
 };

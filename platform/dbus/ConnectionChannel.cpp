@@ -79,18 +79,67 @@ void ConnectionChannel::callBegins() {
 
 void ConnectionChannel::callEnds() {
     const MutexLock lock(mutex_);
+    end();
+}
+
+void ConnectionChannel::end() {
     --inFlight_;
+    if (gathering_ && inFlight_ == 0) {
+        flush();
+        loop_->ring(token_);
+    } else {
+        flushUnlessGathering();
+    }
     resumeIfPossible();
+}
+
+void ConnectionChannel::flushUnlessGathering() {
+    if (!gathering_ || unsent() > kGatheredBytes) {
+        flush();
+    }
 }
 
 bool ConnectionChannel::mayProceed() {
     const MutexLock lock(mutex_);
-    if (!held_ && inFlight_ < limits_.callsInFlight && unsent() <= limits_.unsentBytes) [[likely]] {
+    if (belowLimits()) [[likely]] {
         return true;
     }
     paused_ = true;
     watch(false, writing_);
     return false;
+}
+
+bool ConnectionChannel::hasRoom() const {
+    const MutexLock lock(mutex_);
+    return belowLimits();
+}
+
+std::uint32_t ConnectionChannel::inFlight() const {
+    const MutexLock lock(mutex_);
+    return inFlight_;
+}
+
+void ConnectionChannel::beginGathering() {
+    const MutexLock lock(mutex_);
+    gathering_ = true;
+    paused_ = false;
+    watch(false, writing_);
+}
+
+bool ConnectionChannel::deliver() {
+    const MutexLock lock(mutex_);
+    const std::size_t before = unsent();
+    if (before > 0) {
+        flush();
+    }
+    return unsent() < before;
+}
+
+void ConnectionChannel::endGathering() {
+    const MutexLock lock(mutex_);
+    gathering_ = false;
+    flush();
+    watch(true, writing_);
 }
 
 void ConnectionChannel::resumeIfPossible() {

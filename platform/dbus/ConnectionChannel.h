@@ -3,6 +3,10 @@
 //
 // Reading stops (the channel is paused) while too many calls are under way or too many bytes wait for a client that
 // does not read; whoever brings the numbers down rings the endpoint's loop with the connection's token.
+//
+// While it gathers, the endpoint's thread looks at the connection every now and then by itself: the loop does not watch
+// for what the client sends, and replies wait for the next look. So many calls and replies share one wake-up each.
+// When the last call under way ends, the replies are sent and the loop is rung, so that nobody is idle until then.
 #pragma once
 
 #include "platform/Mutex.h"
@@ -41,13 +45,17 @@ public:
     template <class Write>
     void send(const Write& write) {
         const MutexLock lock(mutex_);
-        if (sending_) {
-            MessageWriter writer(output_);
-            write(writer, nextSerial());
-            flush();
-        }
+        append(write);
+        flushUnlessGathering();
     }
     void callBegins();
+    /// Sends a call's answer, as `send`, and ends the call.
+    template <class Write>
+    void callEnds(const Write& write) {
+        const MutexLock lock(mutex_);
+        append(write);
+        end();
+    }
     void callEnds();
 
     /// Whether the next message may be dispatched. If not, reading stops, and the loop is rung when it may.
@@ -55,6 +63,16 @@ public:
     /// Ends the holding.
     void release();
     bool held() const;
+
+    // For the endpoint's thread: see above.
+    void beginGathering();
+    /// Sends what was gathered. Answers whether there was anything.
+    bool deliver();
+    /// Sends what was gathered, and watches again.
+    void endGathering();
+    /// Whether the next message may be dispatched; nobody is told when it may.
+    bool hasRoom() const;
+    std::uint32_t inFlight() const;
 
     /// The socket takes bytes again.
     void writable();
@@ -65,9 +83,24 @@ public:
     /// For the endpoint's thread, until `close`.
     int descriptor() const { return descriptor_; }
 
+    /// Replies of so many bytes wait for no look.
+    static constexpr std::size_t kGatheredBytes = 16 * 1024;
+
 private:
+    template <class Write>
+    void append(const Write& write) VELA_REQUIRES(mutex_) {
+        if (sending_) {
+            MessageWriter writer(output_);
+            write(writer, nextSerial());
+        }
+    }
+    void end() VELA_REQUIRES(mutex_);
+    void flushUnlessGathering() VELA_REQUIRES(mutex_);
     std::uint32_t nextSerial() VELA_REQUIRES(mutex_) { return ++serial_ == 0 ? ++serial_ : serial_; }
     std::size_t unsent() const VELA_REQUIRES(mutex_) { return output_.size() - sent_; }
+    bool belowLimits() const VELA_REQUIRES(mutex_) {
+        return !held_ && inFlight_ < limits_.callsInFlight && unsent() <= limits_.unsentBytes;
+    }
     void flush() VELA_REQUIRES(mutex_);
     void discardOutput() VELA_REQUIRES(mutex_);
     void resumeIfPossible() VELA_REQUIRES(mutex_);
@@ -92,6 +125,7 @@ private:
     bool writing_ VELA_GUARDED_BY(mutex_) = false;
     bool paused_ VELA_GUARDED_BY(mutex_) = false;
     bool held_ VELA_GUARDED_BY(mutex_) = true;
+    bool gathering_ VELA_GUARDED_BY(mutex_) = false;
 };
 
 } // namespace vela::platform::dbus

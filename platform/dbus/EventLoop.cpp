@@ -1,6 +1,7 @@
 #include "platform/dbus/EventLoop.h"
 
 #include <cerrno>
+#include <chrono>
 #include <sys/eventfd.h>
 #include <utility>
 
@@ -47,9 +48,20 @@ void EventLoop::ring(std::uint64_t token) {
     }
 }
 
-std::size_t EventLoop::wait(std::span<epoll_event> events, std::optional<std::chrono::milliseconds> timeout) {
-    const int milliseconds = timeout ? static_cast<int>(timeout->count()) : -1;
-    const int count = epoll_wait(epoll_.get(), events.data(), static_cast<int>(events.size()), milliseconds);
+std::size_t EventLoop::wait(std::span<epoll_event> events, std::optional<Nanoseconds> timeout) {
+    const int room = static_cast<int>(events.size());
+    int count = -1;
+    if (!timeout || *timeout == Nanoseconds::zero()) {
+        count = epoll_wait(epoll_.get(), events.data(), room, timeout ? 0 : -1);
+    } else {
+        const auto seconds = std::chrono::floor<std::chrono::seconds>(*timeout);
+        const timespec time{seconds.count(), (*timeout - seconds).count()};
+        count = epoll_pwait2(epoll_.get(), events.data(), room, &time, nullptr);
+        if (count < 0 && (errno == ENOSYS || errno == EPERM)) { // an old kernel, or a sandbox's filter
+            const auto milliseconds = std::chrono::ceil<std::chrono::milliseconds>(*timeout);
+            count = epoll_wait(epoll_.get(), events.data(), room, static_cast<int>(milliseconds.count()));
+        }
+    }
     return count < 0 ? 0 : static_cast<std::size_t>(count);
 }
 

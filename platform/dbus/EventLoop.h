@@ -2,11 +2,11 @@
 // `takeRung`, which are the endpoint's thread's. Replies of connections that are gone may hold it for a while.
 #pragma once
 
+#include "platform/Clock.h"
 #include "platform/Mutex.h"
 #include "platform/Result.h"
 #include "platform/linux/FileDescriptor.h"
 
-#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -28,8 +28,9 @@ public:
     /// Wakes the loop and hands it `token`.
     void ring(std::uint64_t token);
 
-    /// Waits for events, for ever without a timeout. Answers how many there are.
-    std::size_t wait(std::span<epoll_event> events, std::optional<std::chrono::milliseconds> timeout);
+    /// Waits for events, for ever without a timeout. Answers how many there are. Kernels before 5.11 wait for whole
+    /// milliseconds, rounded up.
+    std::size_t wait(std::span<epoll_event> events, std::optional<Nanoseconds> timeout);
     /// The tokens rung since the last time, after an event with kRungToken.
     std::vector<std::uint64_t> takeRung();
 

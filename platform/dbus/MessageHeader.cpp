@@ -175,4 +175,40 @@ std::optional<ProtocolError> MessageHeader::read(std::string_view message) {
     return wire.error();
 }
 
+std::optional<ProtocolError> HeaderReader::read(std::string_view message) {
+    constexpr std::size_t kOrderToVersion = 4;
+    constexpr std::size_t kFieldsLength = 12; // behind the body's length and the serial
+    const Frame frame = frameOf(message);
+    const std::string_view header = message.substr(0, frame.headerBytes);
+    const std::string_view body = message.substr(frame.headerBytes);
+    const bool same = frame.state == Frame::State::Known && frame.bytes == message.size() &&
+                      header.size() == last_.size() && body.empty() == header_.body.empty() &&
+                      header.substr(0, kOrderToVersion) == std::string_view(last_).substr(0, kOrderToVersion) &&
+                      header.substr(kFieldsLength) == std::string_view(last_).substr(kFieldsLength);
+    if (same) {
+        header_.serial = frame.serial;
+        header_.body = body;
+        return std::nullopt;
+    }
+    last_.clear();
+    if (auto error = header_.read(message)) {
+        return error;
+    }
+    constexpr std::size_t kLongestKept = 512;
+    if (header.size() <= kLongestKept) {
+        last_ = header;
+        // The texts are to stand in the bytes that stay.
+        for (std::string_view MessageHeader::*const text :
+             {&MessageHeader::path, &MessageHeader::interface, &MessageHeader::member, &MessageHeader::errorName,
+              &MessageHeader::destination, &MessageHeader::sender, &MessageHeader::signature}) {
+            std::string_view& view = header_.*text;
+            if (!view.empty()) {
+                view =
+                    std::string_view(last_).substr(static_cast<std::size_t>(view.data() - message.data()), view.size());
+            }
+        }
+    }
+    return std::nullopt;
+}
+
 } // namespace vela::platform::dbus

@@ -1,6 +1,7 @@
 // Headers of messages, read from literal bytes in both orders.
 #include "platform/dbus/MessageBytes_test.h"
 #include "platform/dbus/MessageReader.h"
+#include "platform/dbus/MessageWriter.h"
 
 #include <cmath>
 #include <gmock/gmock.h>
@@ -242,6 +243,91 @@ TEST(MessageReaderTest, ABodyNeedsASignature) {
     const auto error = header.read(messageOf(MessageType::MethodCall, callFields(), Bytes().u32(1)));
     ASSERT_TRUE(error);
     EXPECT_EQ(error->text, "a body has no signature");
+}
+
+// A sender's headers, one after the other.
+
+std::string callWith(std::string_view member, std::uint32_t serial, std::string_view signature = {},
+                     const Bytes& body = Bytes()) {
+    return callOf(member, signature, body, serial);
+}
+
+void expectAsByItself(HeaderReader& reader, std::string_view message) {
+    MessageHeader alone;
+    ASSERT_FALSE(alone.read(message));
+    ASSERT_FALSE(reader.read(message));
+    const MessageHeader& header = reader.header();
+    EXPECT_EQ(header.type, alone.type);
+    EXPECT_EQ(header.flags, alone.flags);
+    EXPECT_EQ(header.foreignOrder, alone.foreignOrder);
+    EXPECT_EQ(header.serial, alone.serial);
+    EXPECT_EQ(header.path, alone.path);
+    EXPECT_EQ(header.interface, alone.interface);
+    EXPECT_EQ(header.member, alone.member);
+    EXPECT_EQ(header.signature, alone.signature);
+    EXPECT_EQ(header.body.data(), alone.body.data());
+    EXPECT_EQ(header.body.size(), alone.body.size());
+}
+
+TEST(HeaderReaderTest, RepeatedHeadersAreReadAsByThemselves) {
+    HeaderReader reader;
+    for (const std::string& message :
+         {callWith("One", 1, "x", Bytes().u64(5)), callWith("One", 2, "x", Bytes().u64(6)),
+          callWith("One", 3, "y", Bytes().u8(6)), callWith("One", 4, "y", Bytes().u8(7)), callWith("Two", 5),
+          callWith("Two", 6), callWith("One", 7, "x", Bytes().u64(5)), std::string(kLittleCall), std::string(kBigCall),
+          std::string(kBigCall), std::string(kLittleCall)}) {
+        expectAsByItself(reader, message);
+    }
+}
+
+TEST(HeaderReaderTest, TheTextsOutliveTheFirstMessage) {
+    HeaderReader reader;
+    {
+        const std::string first = callWith("One", 1);
+        ASSERT_FALSE(reader.read(first));
+    }
+    const std::string second = callWith("One", 2);
+    ASSERT_FALSE(reader.read(second));
+    EXPECT_EQ(reader.header().member, "One");
+    EXPECT_EQ(reader.header().serial, 2U);
+}
+
+TEST(HeaderReaderTest, ABodyWithoutASignatureIsNoRepetition) {
+    HeaderReader reader;
+    ASSERT_FALSE(reader.read(callWith("One", 1)));
+    EXPECT_TRUE(reader.read(callWith("One", 2, {}, Bytes().u64(5))));
+}
+
+TEST(HeaderReaderTest, AnotherLengthThanAnnouncedIsNoRepetition) {
+    HeaderReader reader;
+    const std::string message = callWith("One", 1, "x", Bytes().u64(5));
+    ASSERT_FALSE(reader.read(message));
+    EXPECT_TRUE(reader.read(message + '\0'));
+    EXPECT_TRUE(reader.read(std::string_view(message).substr(0, message.size() - 1)));
+    EXPECT_FALSE(reader.read(message));
+}
+
+TEST(HeaderReaderTest, AMessageAfterAnErrorIsReadWhole) {
+    HeaderReader reader;
+    ASSERT_FALSE(reader.read(kLittleCall));
+    std::string broken(kLittleCall);
+    broken[16] = 0; // a field's code
+    EXPECT_TRUE(reader.read(broken));
+    expectAsByItself(reader, kLittleCall);
+    expectAsByItself(reader, kLittleCall);
+}
+
+TEST(HeaderReaderTest, LongHeadersAreReadEachTime) {
+    HeaderReader reader;
+    const std::string member(200, 'm');
+    const std::string path = "/" + std::string(600, 'p');
+    for (const std::uint32_t serial : {1U, 2U}) {
+        std::string bytes;
+        MessageWriter writer(bytes);
+        writer.beginCall({.serial = serial, .path = path, .interface = "a.b", .member = member});
+        ASSERT_TRUE(writer.finish());
+        expectAsByItself(reader, bytes);
+    }
 }
 
 } // namespace

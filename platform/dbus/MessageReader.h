@@ -65,6 +65,19 @@ struct MessageHeader {
     std::optional<ProtocolError> read(std::string_view message);
 };
 
+/// Reads the headers of a sender's messages, most of which say the same but for their serial and their length: such a
+/// one costs a comparison. Texts are views into the message or into the reader, good until it reads the next one.
+class HeaderReader {
+public:
+    /// As MessageHeader::read.
+    std::optional<ProtocolError> read(std::string_view message);
+    const MessageHeader& header() const { return header_; }
+
+private:
+    std::string last_; ///< bytes of the header that header_ was read from; empty for none
+    MessageHeader header_;
+};
+
 /// Reads the arguments of a message one after another. The caller has compared the signature; a reader does not. After
 /// the first error every read answers an empty value, so that one look at `error()` behind the last is enough.
 class BodyReader {

@@ -37,14 +37,9 @@ void writeReporter(MessageWriter& writer, const Dictionary& reporter) {
 } // namespace
 
 void PendingCall::answerError(std::string_view name, std::string_view text) {
-    if (const auto channel = std::exchange(channel_, nullptr)) {
-        if (replyExpected_) {
-            channel->send([&](MessageWriter& writer, std::uint32_t serial) {
-                writer.error(name, text, {.serial = serial, .replySerial = serial_});
-            });
-        }
-        end(*channel);
-    }
+    end([&](MessageWriter& writer, std::uint32_t serial) {
+        writer.error(name, text, {.serial = serial, .replySerial = serial_});
+    });
 }
 
 void PendingCall::answerError(const IpcError& error) {

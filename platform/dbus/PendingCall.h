@@ -34,19 +34,14 @@ public:
     /// Sends a return whose arguments `write(writer)` appends. Nothing happens when the call was answered before.
     template <class Write>
     void answer(std::string_view signature, const Write& write) {
-        if (const auto channel = std::exchange(channel_, nullptr)) {
-            if (replyExpected_) {
-                channel->send([&](MessageWriter& writer, std::uint32_t serial) {
-                    writer.beginReturn({.serial = serial, .replySerial = serial_, .signature = signature});
-                    write(writer);
-                    if (!writer.finish()) {
-                        writer.error(kLimitsExceededError, "The reply is larger than a message may be",
-                                     {.serial = serial, .replySerial = serial_});
-                    }
-                });
+        end([&](MessageWriter& writer, std::uint32_t serial) {
+            writer.beginReturn({.serial = serial, .replySerial = serial_, .signature = signature});
+            write(writer);
+            if (!writer.finish()) {
+                writer.error(kLimitsExceededError, "The reply is larger than a message may be",
+                             {.serial = serial, .replySerial = serial_});
             }
-            end(*channel);
-        }
+        });
     }
     void answerEmpty() {
         answer({}, [](MessageWriter&) {});
@@ -56,8 +51,9 @@ public:
     void answerError(const ProtocolError& error) { answerError(error.name, error.text); }
     /// Ends it without an answer: its connection is about to be closed.
     void drop() {
-        if (const auto channel = std::exchange(channel_, nullptr)) {
-            end(*channel);
+        const auto channel = std::exchange(channel_, nullptr);
+        if (channel != nullptr && counted_) {
+            channel->callEnds();
         }
     }
 
@@ -65,9 +61,20 @@ public:
     std::shared_ptr<void> countByToken();
 
 private:
-    void end(ConnectionChannel& channel) const {
-        if (counted_) {
-            channel.callEnds();
+    /// Ends it with what `write(writer, serial)` appends, if an answer is wanted. Nothing happens when it was answered
+    /// before.
+    template <class Write>
+    void end(const Write& write) {
+        const auto channel = std::exchange(channel_, nullptr);
+        if (channel == nullptr) {
+            return;
+        }
+        if (replyExpected_ && counted_) {
+            channel->callEnds(write);
+        } else if (replyExpected_) {
+            channel->send(write);
+        } else if (counted_) {
+            channel->callEnds();
         }
     }
 

@@ -43,12 +43,15 @@ struct Received {
 
 class RawClient {
 public:
-    explicit RawClient(const std::string& path) : socket_(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
+    explicit RawClient(const std::string& path)
+        : RawClient(FileDescriptor(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0))) {
         sockaddr_un address{};
         address.sun_family = AF_UNIX;
         std::memcpy(address.sun_path, path.data(), std::min(path.size(), sizeof(address.sun_path) - 1));
         EXPECT_EQ(connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0)
             << std::strerror(errno);
+    }
+    explicit RawClient(FileDescriptor socket) : socket_(std::move(socket)) {
         const timeval patience{kPatience.count(), 0};
         setsockopt(socket_.get(), SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof(patience));
         setsockopt(socket_.get(), SOL_SOCKET, SO_SNDTIMEO, &patience, sizeof(patience));

@@ -35,18 +35,20 @@ Found find(const MessageHeader& header, const Place& place) {
         for (const ServiceMember& member : members) {
             const bool interface = header.interface.empty() || member.interface == header.interface;
             found.interfaceKnown = found.interfaceKnown || interface;
-            if (!interface || member.name != header.member || found.member != nullptr) {
+            if (!interface || member.name != header.member) {
                 continue;
             }
             if (place.object || member.everywhere) {
                 found.member = &member;
-            } else {
-                found.wrongPlace = true;
+                return;
             }
+            found.wrongPlace = true;
         }
     };
     for (const auto members : {reportingMembers(), inspectionMembers(), standardMembers(), busMembers()}) {
-        search(members);
+        if (search(members); found.member != nullptr) {
+            break;
+        }
     }
     return found;
 }

@@ -1,5 +1,7 @@
 #include "platform/dbus/ServiceConnection.h"
 
+#include "platform/linux/DeferredWakes.h"
+
 #include <algorithm>
 #include <cerrno>
 #include <sys/socket.h>
@@ -49,15 +51,50 @@ ServiceConnection::Turn ServiceConnection::turn(std::span<char> scratch, IpcList
     if (state_ == State::Ended) {
         return Turn::Waiting; // it was queued before it ended
     }
+    const DeferredWakes wakes;
     budget_ = kMessagesPerTurn;
+    if (gathering_ && channel_->deliver()) {
+        delivered_ = true;
+    }
     takeBuffered(delegate);
     if (ending_) {
         return Turn::Ended;
     }
     if (state_ == State::Open && !mayProceed()) {
-        return Turn::Waiting;
+        return untilNextLook(true);
     }
     return budget_ == 0 ? Turn::More : readOnce(scratch, delegate);
+}
+
+bool ServiceConnection::mayProceed() const {
+    if (hungUp_) {
+        return !channel_->held();
+    }
+    return gathering_ ? channel_->hasRoom() : channel_->mayProceed();
+}
+
+/// How it goes on when all that was received has been dispatched, or, at a limit, some of it must wait.
+ServiceConnection::Turn ServiceConnection::untilNextLook(bool atLimit) {
+    if (hungUp_ || (!gathering_ && (found_ < kBetweenGatherings || channel_->inFlight() < 2))) {
+        return Turn::Waiting;
+    }
+    if (gathering_ && soon && found_ < kWorthGathering) {
+        return Turn::Soon; // an early look is no judgement
+    }
+    const bool pays = !gathering_ || found_ >= kWorthGathering || (atLimit && delivered_);
+    if (pays && !gathering_) {
+        channel_->beginGathering();
+    } else if (!pays) {
+        channel_->endGathering();
+    }
+    gathering_ = pays;
+    found_ = 0;
+    delivered_ = false;
+    if (pays) {
+        return Turn::Soon;
+    }
+    // From now on the channel rings when what was received may go on.
+    return atLimit && mayProceed() ? Turn::More : Turn::Waiting;
 }
 
 ServiceConnection::Turn ServiceConnection::readOnce(std::span<char> scratch, IpcListenerDelegate& delegate) {
@@ -66,7 +103,7 @@ ServiceConnection::Turn ServiceConnection::readOnce(std::span<char> scratch, Ipc
         return Turn::More;
     }
     if (count < 0 && errno == EAGAIN) {
-        return hungUp_ ? Turn::Ended : Turn::Waiting;
+        return hungUp_ ? Turn::Ended : untilNextLook();
     }
     if (count <= 0) {
         return Turn::Ended; // what is left over is half a message
@@ -83,8 +120,10 @@ ServiceConnection::Turn ServiceConnection::readOnce(std::span<char> scratch, Ipc
     if (ending_) {
         return Turn::Ended;
     }
-    const bool more = budget_ == 0 || hungUp_;
-    return more && (state_ != State::Open || mayProceed()) ? Turn::More : Turn::Waiting;
+    if (state_ == State::Open && !mayProceed()) {
+        return untilNextLook(true);
+    }
+    return budget_ == 0 || hungUp_ ? Turn::More : untilNextLook();
 }
 
 void ServiceConnection::takeBuffered(IpcListenerDelegate& delegate) {
@@ -157,6 +196,7 @@ bool ServiceConnection::takeMessage(std::string_view& bytes) {
         return false;
     }
     --budget_;
+    ++found_;
     dispatch(bytes.substr(0, frame.bytes));
     bytes.remove_prefix(frame.bytes);
     return true;
@@ -175,11 +215,11 @@ void ServiceConnection::refuseMessage(const Frame& frame) {
 }
 
 void ServiceConnection::dispatch(std::string_view message) {
-    MessageHeader header;
-    if (header.read(message)) {
+    if (headers_.read(message)) {
         ending_ = broken_ = true;
         return;
     }
+    const MessageHeader& header = headers_.header();
     if (header.type != MessageType::MethodCall) {
         return; // nobody was asked anything, and nobody listens to signals
     }
@@ -191,6 +231,9 @@ void ServiceConnection::dispatch(std::string_view message) {
 }
 
 void ServiceConnection::hangUp() {
+    if (std::exchange(gathering_, false)) {
+        channel_->deliver(); // its end may be the service's own
+    }
     hungUp_ = true;
     channel_->hangUp();
 }

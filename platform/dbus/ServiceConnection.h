@@ -54,6 +54,7 @@ public:
     enum class Turn : std::uint8_t {
         Waiting, ///< for the socket, or for the channel to ring
         More,    ///< there is more to do at once
+        Soon,    ///< it gathers: to be looked at again after kGatheringTime, whatever the socket says
         Ended,   ///< to be ended
     };
     /// Reads once at most and dispatches up to kMessagesPerTurn messages, so that no client keeps the others waiting.
@@ -74,8 +75,17 @@ public:
     int processDescriptor() const { return process_.get(); }
 
     bool queued = false; ///< for its next turn, by the endpoint
+    bool soon = false;   ///< for its next look, by the endpoint
 
     static constexpr int kMessagesPerTurn = 8;
+
+    // A client that does not wait for each reply is looked at from time to time, so that its calls and their replies
+    // share wake-ups, which cost more than the calls do. It goes on for as long as it pays.
+    static constexpr Nanoseconds kGatheringTime = std::chrono::microseconds(200);
+    /// Messages that a look must find.
+    static constexpr unsigned kWorthGathering = 4;
+    /// Messages between two attempts.
+    static constexpr unsigned kBetweenGatherings = 64;
 
 private:
     enum class State : std::uint8_t { Authenticating, Open, Ended };
@@ -85,8 +95,9 @@ private:
         UniqueFunction<void()> invalidation;
     };
     Handlers close();
-    bool mayProceed() const { return hungUp_ ? !channel_->held() : channel_->mayProceed(); }
+    bool mayProceed() const;
     Turn readOnce(std::span<char> scratch, IpcListenerDelegate& delegate);
+    Turn untilNextLook(bool full = false);
     void takeBuffered(IpcListenerDelegate& delegate);
     void take(std::string_view& bytes, IpcListenerDelegate& delegate);
     bool takeAuthentication(std::string_view& bytes, IpcListenerDelegate& delegate);
@@ -104,6 +115,7 @@ private:
     CallTarget target_;
     State state_ = State::Authenticating;
     std::optional<ServerAuthentication> authentication_;
+    HeaderReader headers_;
     std::string received_; ///< bytes that were not dispatched yet, behind `taken_` that were
     std::size_t taken_ = 0;
     std::uint64_t skipped_ = 0; ///< bytes of a message too long that are still to come
@@ -111,6 +123,9 @@ private:
     bool ending_ = false;       ///< what is left is not wanted
     bool broken_ = false;       ///< the bytes are no messages
     bool hungUp_ = false;
+    bool gathering_ = false;
+    bool delivered_ = false; ///< this look sent replies
+    unsigned found_ = 0;     ///< messages that this look found; while not gathering, since the last attempt
 
     Mutex mutex_;
     std::shared_ptr<ReportingServiceProtocol> object_ VELA_GUARDED_BY(mutex_);

@@ -143,6 +143,7 @@ void DbusServiceEndpoint::loopTurn() {
     for (std::size_t index = 0; index < count; ++index) {
         handle(events[index].data.u64, events[index].events);
     }
+    queueThoseDue();
     runQueued();
     endLateAuthentications();
     if (acceptingAgainAt_ && std::chrono::steady_clock::now() >= *acceptingAgainAt_) {
@@ -153,9 +154,9 @@ void DbusServiceEndpoint::loopTurn() {
     }
 }
 
-std::optional<std::chrono::milliseconds> DbusServiceEndpoint::timeout() {
+std::optional<Nanoseconds> DbusServiceEndpoint::timeout() {
     if (!queued_.empty()) {
-        return 0ms;
+        return Nanoseconds::zero();
     }
     // Those that are through need no deadline any more.
     while (!deadlines_.empty()) {
@@ -169,10 +170,13 @@ std::optional<std::chrono::milliseconds> DbusServiceEndpoint::timeout() {
     if (!deadlines_.empty()) {
         next = next ? std::min(*next, deadlines_.front().time) : deadlines_.front().time;
     }
+    if (!soon_.empty()) {
+        next = next ? std::min(*next, soonAt_) : soonAt_;
+    }
     if (!next) {
         return std::nullopt;
     }
-    return std::max(0ms, std::chrono::ceil<std::chrono::milliseconds>(*next - std::chrono::steady_clock::now()));
+    return std::max(Nanoseconds::zero(), Nanoseconds(*next - std::chrono::steady_clock::now()));
 }
 
 void DbusServiceEndpoint::handle(std::uint64_t token, std::uint32_t events) {
@@ -219,6 +223,26 @@ void DbusServiceEndpoint::queue(const std::shared_ptr<dbus::ServiceConnection>& 
     }
 }
 
+void DbusServiceEndpoint::queueSoon(const std::shared_ptr<dbus::ServiceConnection>& connection) {
+    if (soon_.empty()) {
+        soonAt_ = std::chrono::steady_clock::now() + dbus::ServiceConnection::kGatheringTime;
+    }
+    if (!std::exchange(connection->soon, true)) {
+        soon_.push_back(connection);
+    }
+}
+
+void DbusServiceEndpoint::queueThoseDue() {
+    if (soon_.empty() || std::chrono::steady_clock::now() < soonAt_) {
+        return;
+    }
+    for (const auto& connection : soon_) {
+        connection->soon = false;
+        queue(connection);
+    }
+    soon_.clear();
+}
+
 void DbusServiceEndpoint::runRung() {
     for (const std::uint64_t token : loop_->takeRung()) {
         if (const auto place = connections_.find(token); place != connections_.end()) {
@@ -235,6 +259,9 @@ void DbusServiceEndpoint::runQueued() {
             break;
         case dbus::ServiceConnection::Turn::More:
             queue(connection);
+            break;
+        case dbus::ServiceConnection::Turn::Soon:
+            queueSoon(connection);
             break;
         case dbus::ServiceConnection::Turn::Ended:
             end(connection);
@@ -285,6 +312,7 @@ void DbusServiceEndpoint::endAll() {
     }
     connectionsOfUser_.clear();
     queued_.clear();
+    soon_.clear();
 }
 
 } // namespace vela::platform

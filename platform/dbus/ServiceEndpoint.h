@@ -105,7 +105,7 @@ private:
     void loopTurn();
     void handle(std::uint64_t token, std::uint32_t events);
     void handleConnection(std::uint64_t token, std::uint32_t events);
-    std::optional<std::chrono::milliseconds> timeout();
+    std::optional<Nanoseconds> timeout();
 
     void acceptConnections();
     void pauseAccepting();
@@ -115,6 +115,8 @@ private:
     void addConnection(FileDescriptor socket, dbus::PeerCredentials peer, std::string refusal);
 
     void queue(const std::shared_ptr<dbus::ServiceConnection>& connection);
+    void queueSoon(const std::shared_ptr<dbus::ServiceConnection>& connection);
+    void queueThoseDue();
     void runQueued();
     void runRung();
     void endLateAuthentications();
@@ -140,6 +142,8 @@ private:
     std::unordered_map<std::uint64_t, std::shared_ptr<dbus::ServiceConnection>> connections_;
     std::unordered_map<std::uint32_t, std::uint32_t> connectionsOfUser_;
     std::vector<std::shared_ptr<dbus::ServiceConnection>> queued_; ///< for their next turn
+    std::vector<std::shared_ptr<dbus::ServiceConnection>> soon_;   ///< for a turn at soonAt_
+    Time soonAt_;
     struct Deadline {
         Time time;
         std::uint64_t connection;
