@@ -42,6 +42,8 @@ private:
 
 namespace {
 
+constexpr std::size_t kUsualSnapshot = 4096; // bytes
+
 Dictionary dictionaryOf(const MaladySignature& signature) {
     DictionaryBuilder builder;
     builder.add("domain", std::string_view(signature.domain));
@@ -103,6 +105,7 @@ public:
         StoreRecord record = store_.newDelivery(DeliveryBackend::Malady, StoreOperation::Snapshot);
         record.urgency = StoreUrgency::Now;
         record.builder = [snapshot, source = source_] { return snapshot->take(*source); };
+        record.builderBytes = kUsualSnapshot;
         record.done = [snapshot](bool stored) { snapshot->answer(stored); };
         store_.add(std::move(record));
     }

@@ -21,9 +21,13 @@ std::optional<DropReason> StoreQueue::push(StoreRecord& record) {
         }
         ++held_;
         heldBytes_ += record.weight;
-        wakes = records_.empty() || records_.size() + 1 == limits_.group || record.urgency > urgency_;
+        ++waiting_;
+        wakes = waiting_ == 1 || waiting_ == limits_.group || record.urgency > urgency_;
         urgency_ = std::max(urgency_, record.urgency);
         awake_ = awake_ || wakes;
+        if (records_.size() == std::max(kPiece, limits_.group)) {
+            pieces_.push_back(std::exchange(records_, std::exchange(spare_, {})));
+        }
         records_.push_back(std::move(record));
     }
     if (wakes) {
@@ -70,14 +74,23 @@ std::size_t StoreQueue::held() const {
 
 StoreQueue::State StoreQueue::state() const {
     const std::lock_guard lock(mutex_);
-    return {records_.size(), urgency_, ledgerChanged_.load(), closed_, flush_};
+    return {waiting_, urgency_, ledgerChanged_.load(), closed_, flush_};
 }
 
 void StoreQueue::take(std::vector<StoreRecord>& records) {
     assert(records.empty());
     const std::lock_guard lock(mutex_);
-    records.swap(records_);
-    urgency_ = StoreUrgency::Usual;
+    if (pieces_.empty()) {
+        records.swap(records_);
+    } else {
+        records.swap(pieces_.front());
+        spare_ = std::move(pieces_.front());
+        pieces_.pop_front();
+    }
+    waiting_ -= records.size();
+    if (waiting_ == 0) {
+        urgency_ = StoreUrgency::Usual;
+    }
 }
 
 void StoreQueue::release(std::size_t records, std::size_t bytes) {

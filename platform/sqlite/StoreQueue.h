@@ -12,6 +12,7 @@
 #include <condition_variable>
 #include <cstddef>
 #include <cstdint>
+#include <deque>
 #include <mutex>
 #include <optional>
 #include <vector>
@@ -25,6 +26,9 @@ public:
         std::size_t bytes = 32 * 1024 * 1024;
         std::size_t group = 64; ///< records that are committed together
     };
+    /// A backlog waits in pieces of so many, whose memory goes round.
+    static constexpr std::size_t kPiece = 1024;
+
     /// What the writer decides by.
     struct State {
         std::size_t waiting = 0; ///< records not taken yet
@@ -50,7 +54,8 @@ public:
     std::size_t held() const;
 
     State state() const;
-    /// Everything that waits, in the order pushed; `records` is empty before.
+    /// The oldest that wait, at most kPiece or one group, in the order pushed. `records` is empty before; its memory
+    /// serves those that come.
     void take(std::vector<StoreRecord>& records);
     /// The writer looks at the ledger from here on.
     void clearLedgerChange() { ledgerChanged_.exchange(false); }
@@ -70,7 +75,10 @@ private:
     std::condition_variable writer_;
     std::condition_variable flushers_;
     // Guarded by mutex_.
-    std::vector<StoreRecord> records_;
+    std::deque<std::vector<StoreRecord>> pieces_; ///< full ones, the oldest first
+    std::vector<StoreRecord> records_;            ///< behind them
+    std::vector<StoreRecord> spare_;              ///< empty; its memory is used next
+    std::size_t waiting_ = 0;
     std::size_t held_ = 0;
     std::size_t heldBytes_ = 0;
     StoreUrgency urgency_ = StoreUrgency::Usual; ///< the greatest of those that wait

@@ -130,6 +130,63 @@ TEST_F(StoreQueueTest, AFlushThatWasAnsweredIsNotWaitedFor) {
     queue_.waitFlushed(flush);
 }
 
+TEST_F(StoreQueueTest, ABacklogComesOutInPiecesInTheOrderPushed) {
+    StoreQueue queue({.records = 10'000, .bytes = 100 * 1024 * 1024, .group = 64});
+    std::int64_t pushed = 0;
+    std::int64_t expected = 0;
+    std::vector<StoreRecord> taken;
+    const auto pushMore = [&](int count) {
+        for (; count > 0; --count) {
+            ASSERT_EQ(push(queue, record(++pushed)), std::nullopt);
+        }
+    };
+    const auto takePiece = [&](std::size_t size) {
+        taken.clear();
+        queue.take(taken);
+        ASSERT_EQ(taken.size(), size);
+        for (const StoreRecord& each : taken) {
+            ASSERT_EQ(each.session, ++expected);
+        }
+        EXPECT_EQ(queue.state().waiting, static_cast<std::size_t>(pushed - expected));
+    };
+    pushMore(2'500);
+    takePiece(1'024);
+    pushMore(100);
+    takePiece(1'024);
+    pushMore(1'000);
+    takePiece(1'024);
+    takePiece(528);
+    takePiece(0);
+    pushMore(1);
+    takePiece(1);
+}
+
+TEST_F(StoreQueueTest, AnUrgencyStandsUntilAllIsTaken) {
+    StoreQueue queue({.records = 10'000, .bytes = 100 * 1024 * 1024, .group = 64});
+    StoreRecord urgent = record();
+    urgent.urgency = StoreUrgency::Now;
+    for (int count = 0; count < 2'000; ++count) {
+        push(queue, record());
+    }
+    push(queue, std::move(urgent));
+    std::vector<StoreRecord> taken;
+    queue.take(taken);
+    EXPECT_EQ(queue.state().urgency, StoreUrgency::Now);
+    taken.clear();
+    queue.take(taken);
+    EXPECT_EQ(queue.state().urgency, StoreUrgency::Usual);
+}
+
+TEST_F(StoreQueueTest, AGroupOfTheSettingsIsOnePiece) {
+    StoreQueue queue({.records = 10'000, .bytes = 100 * 1024 * 1024, .group = 3'000});
+    for (int count = 0; count < 4'000; ++count) {
+        push(queue, record());
+    }
+    std::vector<StoreRecord> taken;
+    queue.take(taken);
+    EXPECT_EQ(taken.size(), 3'000U);
+}
+
 } // namespace
 
 } // namespace vela::platform

@@ -12,10 +12,8 @@ namespace {
 
 constexpr std::chrono::milliseconds kSoon{5};
 constexpr std::chrono::seconds kLongestRetryDelay{30};
-/// Memory for more records than this is given back after a burst.
-constexpr std::size_t kRecordsKept = 4096;
 /// Of a backlog, so many share a commit at the most.
-constexpr std::size_t kMostTogether = 1024;
+constexpr std::size_t kMostTogether = StoreQueue::kPiece;
 
 /// Whether a file that could not be opened may be opened later without anybody's doing.
 bool mayPass(int error) {
@@ -144,9 +142,6 @@ bool StoreWriter::takeMore() {
         return true;
     }
     taken_.clear();
-    if (taken_.capacity() > kRecordsKept) {
-        std::vector<StoreRecord>().swap(taken_);
-    }
     settled_ = 0;
     queue_.take(taken_);
     return !taken_.empty();
@@ -196,17 +191,15 @@ void StoreWriter::settle(std::span<StoreRecord> group, bool stored) {
     std::size_t bytes = 0;
     for (StoreRecord& each : group) {
         bytes += each.weight;
-        // What the record holds is given up here, one after another.
-        StoreRecord record = std::move(each);
-        const bool kept = stored && !record.refused;
-        if (record.entry != nullptr && kept) {
-            record.entry->delivered(record.backend);
-        } else if (record.entry != nullptr) {
-            record.entry->dropped(record.backend, record.refused.value_or(DropReason::StoreFailed));
+        const bool kept = stored && !each.refused;
+        if (each.entry != nullptr && kept) {
+            each.entry->delivered(each.backend);
+        } else if (each.entry != nullptr) {
+            each.entry->dropped(each.backend, each.refused.value_or(DropReason::StoreFailed));
             lostSince_ += stored ? 0 : 1;
         }
-        if (record.done) {
-            record.done(kept);
+        if (each.done) {
+            each.done(kept);
         }
     }
     settled_ += group.size();
