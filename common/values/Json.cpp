@@ -241,6 +241,15 @@ public:
         }
     }
 
+    void addValues(const Dictionary& dictionary) {
+        char before = '[';
+        for (const auto& [key, value] : dictionary) {
+            json_.add(std::exchange(before, ','));
+            add(value);
+        }
+        json_.add(dictionary.empty() ? std::string_view("[]") : std::string_view("]"));
+    }
+
 private:
     void addArray(const Array& array) {
         if (array.empty()) {
@@ -302,6 +311,10 @@ private:
 };
 
 } // namespace
+
+void appendJsonValues(std::string& text, const Dictionary& dictionary) {
+    Writer(text, JsonLayout::Compact, 0).addValues(dictionary);
+}
 
 void appendJsonString(std::string& json, std::string_view text) {
     Sink sink(json);

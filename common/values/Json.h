@@ -21,6 +21,9 @@ std::string jsonText(ValueRef value, JsonLayout layout = JsonLayout::Compact);
 /// `depth`: how many containers the value stands in, for the indentation of the pretty layout.
 void appendJson(std::string& text, ValueRef value, JsonLayout layout = JsonLayout::Compact, std::size_t depth = 0);
 
+/// The dictionary's values without their keys, in order, as a JSON array on one line.
+void appendJsonValues(std::string& text, const Dictionary& dictionary);
+
 /// `text` as a JSON string, quotation marks included.
 void appendJsonString(std::string& json, std::string_view text);
 

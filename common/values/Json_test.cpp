@@ -187,6 +187,14 @@ TEST(JsonTest, AnotherParserReadsTheSame) {
     }
 }
 
+TEST(JsonTest, ADictionarysValuesAreAnArray) {
+    std::string text = "before";
+    appendJsonValues(text, Dictionary{{"a", 1}, {"b", "two"}, {"c", Dictionary{{"d", 1.0}}}, {"e", Array{1, 2}}});
+    EXPECT_EQ(text, R"(before[1,"two",{"d":1.0},[1,2]])");
+    appendJsonValues(text, Dictionary());
+    EXPECT_EQ(text, R"(before[1,"two",{"d":1.0},[1,2]][])");
+}
+
 } // namespace
 
 } // namespace vela

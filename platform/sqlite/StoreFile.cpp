@@ -213,16 +213,9 @@ std::string_view StoreFile::encode(const Dictionary& payload, bool withKeys) {
     values_.clear();
     if (withKeys) {
         appendJson(values_, Value(payload));
-        return values_;
+    } else {
+        appendJsonValues(values_, payload);
     }
-    values_ += '[';
-    for (const auto& [key, value] : payload) {
-        if (values_.size() > 1) {
-            values_ += ',';
-        }
-        appendJson(values_, value);
-    }
-    values_ += ']';
     return values_;
 }
 
