@@ -45,6 +45,7 @@ void ConnectionChannel::flush() {
             if (sent_ > output_.size() / 2) {
                 output_.erase(0, std::exchange(sent_, 0));
             }
+            noteOpen();
             return watch(reading_, true);
         } else if (errno != EINTR) {
             return discardOutput(); // the end of the connection shows when reading
@@ -52,6 +53,7 @@ void ConnectionChannel::flush() {
     }
     output_.clear();
     sent_ = 0;
+    noteOpen();
     if (output_.capacity() > kKeptBytes) {
         output_.shrink_to_fit();
     }
@@ -61,6 +63,7 @@ void ConnectionChannel::discardOutput() {
     sending_ = false;
     output_ = std::string();
     sent_ = 0;
+    noteOpen();
     watch(reading_, false);
 }
 
@@ -72,19 +75,14 @@ void ConnectionChannel::watch(bool reading, bool writing) {
     writing_ = writing;
 }
 
-void ConnectionChannel::callBegins() {
-    const MutexLock lock(mutex_);
-    ++inFlight_;
-}
-
 void ConnectionChannel::callEnds() {
     const MutexLock lock(mutex_);
     end();
 }
 
 void ConnectionChannel::end() {
-    --inFlight_;
-    if (gathering_ && inFlight_ == 0) {
+    const bool wasLast = inFlight_.fetch_sub(1, std::memory_order_relaxed) == 1;
+    if (gathering_ && !looking_ && wasLast) {
         flush();
         loop_->ring(token_);
     } else {
@@ -100,8 +98,11 @@ void ConnectionChannel::flushUnlessGathering() {
 }
 
 bool ConnectionChannel::mayProceed() {
-    const MutexLock lock(mutex_);
     if (belowLimits()) [[likely]] {
+        return true;
+    }
+    const MutexLock lock(mutex_);
+    if (belowLimits()) {
         return true;
     }
     paused_ = true;
@@ -109,14 +110,13 @@ bool ConnectionChannel::mayProceed() {
     return false;
 }
 
-bool ConnectionChannel::hasRoom() const {
-    const MutexLock lock(mutex_);
-    return belowLimits();
-}
+bool ConnectionChannel::hasRoom() const { return belowLimits(); }
 
-std::uint32_t ConnectionChannel::inFlight() const {
-    const MutexLock lock(mutex_);
-    return inFlight_;
+void ConnectionChannel::noteOpen() {
+    const bool open = !held_ && unsent() <= limits_.unsentBytes;
+    if (open != open_.load(std::memory_order_relaxed)) {
+        open_.store(open, std::memory_order_release);
+    }
 }
 
 void ConnectionChannel::beginGathering() {
@@ -126,25 +126,34 @@ void ConnectionChannel::beginGathering() {
     watch(false, writing_);
 }
 
-bool ConnectionChannel::deliver() {
+bool ConnectionChannel::beginLook() {
     const MutexLock lock(mutex_);
+    looking_ = true;
     const std::size_t before = unsent();
-    if (before > 0) {
-        flush();
-    }
+    flush();
     return unsent() < before;
+}
+
+bool ConnectionChannel::endLook() {
+    const MutexLock lock(mutex_);
+    looking_ = false;
+    if (inFlight() > 0) {
+        return false;
+    }
+    flush();
+    return true;
 }
 
 void ConnectionChannel::endGathering() {
     const MutexLock lock(mutex_);
-    gathering_ = false;
+    gathering_ = looking_ = false;
     flush();
     watch(true, writing_);
 }
 
 void ConnectionChannel::resumeIfPossible() {
     // Not at the first free place: reading in runs costs fewer wake-ups.
-    if (paused_ && !held_ && inFlight_ <= limits_.callsInFlight / 2 && unsent() <= limits_.unsentBytes / 2) {
+    if (paused_ && !held_ && inFlight() <= limits_.callsInFlight / 2 && unsent() <= limits_.unsentBytes / 2) {
         paused_ = false;
         watch(true, writing_);
         loop_->ring(token_);
@@ -154,6 +163,7 @@ void ConnectionChannel::resumeIfPossible() {
 void ConnectionChannel::release() {
     const MutexLock lock(mutex_);
     if (std::exchange(held_, false)) {
+        noteOpen();
         // Also where nothing waits: a client that hung up while it was held is looked at again.
         paused_ = true;
         resumeIfPossible();

@@ -14,6 +14,7 @@
 #include "platform/dbus/MessageWriter.h"
 #include "platform/linux/FileDescriptor.h"
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -48,7 +49,8 @@ public:
         append(write);
         flushUnlessGathering();
     }
-    void callBegins();
+    /// For the endpoint's thread.
+    void callBegins() { inFlight_.fetch_add(1, std::memory_order_relaxed); }
     /// Sends a call's answer, as `send`, and ends the call.
     template <class Write>
     void callEnds(const Write& write) {
@@ -66,13 +68,16 @@ public:
 
     // For the endpoint's thread: see above.
     void beginGathering();
-    /// Sends what was gathered. Answers whether there was anything.
-    bool deliver();
+    /// Sends what was gathered, and answers whether there was anything. Until `endLook` the end of the last call under
+    /// way is no reason to ring.
+    bool beginLook();
+    /// Answers whether no call is under way: then the replies are sent.
+    bool endLook();
     /// Sends what was gathered, and watches again.
     void endGathering();
     /// Whether the next message may be dispatched; nobody is told when it may.
     bool hasRoom() const;
-    std::uint32_t inFlight() const;
+    std::uint32_t inFlight() const { return inFlight_.load(std::memory_order_relaxed); }
 
     /// The socket takes bytes again.
     void writable();
@@ -92,15 +97,16 @@ private:
         if (sending_) {
             MessageWriter writer(output_);
             write(writer, nextSerial());
+            noteOpen();
         }
     }
     void end() VELA_REQUIRES(mutex_);
     void flushUnlessGathering() VELA_REQUIRES(mutex_);
     std::uint32_t nextSerial() VELA_REQUIRES(mutex_) { return ++serial_ == 0 ? ++serial_ : serial_; }
     std::size_t unsent() const VELA_REQUIRES(mutex_) { return output_.size() - sent_; }
-    bool belowLimits() const VELA_REQUIRES(mutex_) {
-        return !held_ && inFlight_ < limits_.callsInFlight && unsent() <= limits_.unsentBytes;
-    }
+    /// Without the lock, which each reply takes; only a hint as far as `open_` goes.
+    bool belowLimits() const { return open_.load(std::memory_order_acquire) && inFlight() < limits_.callsInFlight; }
+    void noteOpen() VELA_REQUIRES(mutex_);
     void flush() VELA_REQUIRES(mutex_);
     void discardOutput() VELA_REQUIRES(mutex_);
     void resumeIfPossible() VELA_REQUIRES(mutex_);
@@ -113,19 +119,24 @@ private:
     const int descriptor_;
     bool registered_ = false;
 
+    /// Calls under way. It grows on the endpoint's thread alone, and becomes less with the lock held.
+    std::atomic<std::uint32_t> inFlight_ = 0;
+    /// Whether neither `held_` nor bytes that wait are in the way. Changes with the lock held.
+    std::atomic<bool> open_ = false;
+
     mutable Mutex mutex_;
     FileDescriptor socket_ VELA_GUARDED_BY(mutex_);
     std::string output_ VELA_GUARDED_BY(mutex_); ///< what was not sent yet, behind `sent_` bytes that were
     std::size_t sent_ VELA_GUARDED_BY(mutex_) = 0;
     std::uint32_t serial_ VELA_GUARDED_BY(mutex_) = 0; ///< of the last message sent
-    std::uint32_t inFlight_ VELA_GUARDED_BY(mutex_) = 0;
-    bool sending_ VELA_GUARDED_BY(mutex_) = true;  ///< false once nobody reads
-    bool watched_ VELA_GUARDED_BY(mutex_) = false; ///< by the loop
-    bool reading_ VELA_GUARDED_BY(mutex_) = true;  ///< events that the loop waits for
+    bool sending_ VELA_GUARDED_BY(mutex_) = true;      ///< false once nobody reads
+    bool watched_ VELA_GUARDED_BY(mutex_) = false;     ///< by the loop
+    bool reading_ VELA_GUARDED_BY(mutex_) = true;      ///< events that the loop waits for
     bool writing_ VELA_GUARDED_BY(mutex_) = false;
     bool paused_ VELA_GUARDED_BY(mutex_) = false;
     bool held_ VELA_GUARDED_BY(mutex_) = true;
     bool gathering_ VELA_GUARDED_BY(mutex_) = false;
+    bool looking_ VELA_GUARDED_BY(mutex_) = false;
 };
 
 } // namespace vela::platform::dbus

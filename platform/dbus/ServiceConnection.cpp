@@ -53,15 +53,15 @@ ServiceConnection::Turn ServiceConnection::turn(std::span<char> scratch, IpcList
     }
     const DeferredWakes wakes;
     budget_ = kMessagesPerTurn;
-    if (gathering_ && channel_->deliver()) {
-        delivered_ = true;
+    if (gathering_ && !std::exchange(looking_, true)) {
+        delivered_ = channel_->beginLook();
     }
     takeBuffered(delegate);
     if (ending_) {
         return Turn::Ended;
     }
     if (state_ == State::Open && !mayProceed()) {
-        return untilNextLook(true);
+        return endLook(true);
     }
     return budget_ == 0 ? Turn::More : readOnce(scratch, delegate);
 }
@@ -74,25 +74,32 @@ bool ServiceConnection::mayProceed() const {
 }
 
 /// How it goes on when all that was received has been dispatched, or, at a limit, some of it must wait.
-ServiceConnection::Turn ServiceConnection::untilNextLook(bool atLimit) {
-    if (hungUp_ || (!gathering_ && (found_ < kBetweenGatherings || channel_->inFlight() < 2))) {
+ServiceConnection::Turn ServiceConnection::endLook(bool atLimit) {
+    if (hungUp_) {
         return Turn::Waiting;
     }
-    if (gathering_ && soon && found_ < kWorthGathering) {
-        return Turn::Soon; // an early look is no judgement
-    }
-    const bool pays = !gathering_ || found_ >= kWorthGathering || (atLimit && delivered_);
-    if (pays && !gathering_) {
+    if (!gathering_) {
+        if (found_ < kBetweenGatherings || channel_->inFlight() < 2) {
+            return Turn::Waiting;
+        }
+        gathering_ = true;
+        found_ = 0;
         channel_->beginGathering();
-    } else if (!pays) {
-        channel_->endGathering();
-    }
-    gathering_ = pays;
-    found_ = 0;
-    delivered_ = false;
-    if (pays) {
         return Turn::Soon;
     }
+    looking_ = false;
+    if (found_ >= kWorthGathering || (atLimit && delivered_)) {
+        found_ = 0;
+        // Those who work on the calls are as fast as this thread: it goes on.
+        return channel_->endLook() ? Turn::More : Turn::Soon;
+    }
+    if (soon) { // a look before its time is no judgement
+        channel_->endLook();
+        return Turn::Soon;
+    }
+    gathering_ = false;
+    found_ = 0;
+    channel_->endGathering();
     // From now on the channel rings when what was received may go on.
     return atLimit && mayProceed() ? Turn::More : Turn::Waiting;
 }
@@ -103,7 +110,7 @@ ServiceConnection::Turn ServiceConnection::readOnce(std::span<char> scratch, Ipc
         return Turn::More;
     }
     if (count < 0 && errno == EAGAIN) {
-        return hungUp_ ? Turn::Ended : untilNextLook();
+        return hungUp_ ? Turn::Ended : endLook();
     }
     if (count <= 0) {
         return Turn::Ended; // what is left over is half a message
@@ -121,9 +128,9 @@ ServiceConnection::Turn ServiceConnection::readOnce(std::span<char> scratch, Ipc
         return Turn::Ended;
     }
     if (state_ == State::Open && !mayProceed()) {
-        return untilNextLook(true);
+        return endLook(true);
     }
-    return budget_ == 0 || hungUp_ ? Turn::More : untilNextLook();
+    return budget_ == 0 || hungUp_ ? Turn::More : endLook();
 }
 
 void ServiceConnection::takeBuffered(IpcListenerDelegate& delegate) {
@@ -232,7 +239,7 @@ void ServiceConnection::dispatch(std::string_view message) {
 
 void ServiceConnection::hangUp() {
     if (std::exchange(gathering_, false)) {
-        channel_->deliver(); // its end may be the service's own
+        channel_->endGathering(); // the end may be the service's own
     }
     hungUp_ = true;
     channel_->hangUp();

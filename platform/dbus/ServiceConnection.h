@@ -97,7 +97,7 @@ private:
     Handlers close();
     bool mayProceed() const;
     Turn readOnce(std::span<char> scratch, IpcListenerDelegate& delegate);
-    Turn untilNextLook(bool full = false);
+    Turn endLook(bool atLimit = false);
     void takeBuffered(IpcListenerDelegate& delegate);
     void take(std::string_view& bytes, IpcListenerDelegate& delegate);
     bool takeAuthentication(std::string_view& bytes, IpcListenerDelegate& delegate);
@@ -124,6 +124,7 @@ private:
     bool broken_ = false;       ///< the bytes are no messages
     bool hungUp_ = false;
     bool gathering_ = false;
+    bool looking_ = false;   ///< while it gathers: between the begin of a look and its end
     bool delivered_ = false; ///< this look sent replies
     unsigned found_ = 0;     ///< messages that this look found; while not gathering, since the last attempt
 

@@ -235,7 +235,7 @@ TEST(LinuxWorkQueuesQualityTest, ThreadsTakeOnTheNiceValueOfTheirQueueWhereTheyM
         Gate gate;
         const auto queue = queues.makeSerialQueue("queue", quality);
         queue->post(gate.item());
-        for (int i = 0; i < 15; ++i) {
+        for (int i = 0; i < 63; ++i) {
             queue->post([] {});
         }
         queue->post([&nice] { nice.set_value(threadNice()); });

@@ -23,7 +23,7 @@ constexpr unsigned kItemsUnshared = 16;
 
 /// How many items of a less urgent queue run before the thread takes on its priority: to change it and change it back
 /// would cost as much as a few small items.
-constexpr unsigned kItemsAtOldPriority = 16;
+constexpr unsigned kItemsAtOldPriority = 64;
 
 constinit thread_local Worker* currentWorker = nullptr;
 
