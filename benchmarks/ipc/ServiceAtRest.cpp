@@ -52,6 +52,22 @@ std::vector<double> firstReplies(unsigned times) {
     return seconds;
 }
 
+namespace {
+
+/// Until nothing has run for two seconds: the store writes its ledger a second after the last delivery.
+void waitUntilStill(pid_t process) {
+    constexpr std::chrono::seconds kStill{2};
+    std::uint64_t before = 0;
+    std::uint64_t now = overThreads(process, "voluntary_ctxt_switches");
+    for (int attempt = 0; attempt < 10 && now != before; ++attempt) {
+        before = now;
+        std::this_thread::sleep_for(kStill);
+        now = overThreads(process, "voluntary_ctxt_switches");
+    }
+}
+
+} // namespace
+
 AtRest serviceAtRest(bool withSession, unsigned seconds) {
     constexpr int kMessages = 100;
     const ServiceProcess service;
@@ -66,7 +82,7 @@ AtRest serviceAtRest(bool withSession, unsigned seconds) {
     } else {
         connection.reset();
     }
-    processorSecondsWhenIdle(service.process());
+    waitUntilStill(service.process());
     const std::uint64_t wakeUps = overThreads(service.process(), "voluntary_ctxt_switches");
     const std::uint64_t preempted = overThreads(service.process(), "nonvoluntary_ctxt_switches");
     std::this_thread::sleep_for(std::chrono::seconds(seconds));

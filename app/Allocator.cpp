@@ -1,0 +1,6 @@
+// What jemalloc reads at the program's start, by this name. Linked where the service has that allocator.
+extern "C" {
+extern const char* malloc_conf;
+// Few threads allocate, and at rest each arena costs memory.
+const char* malloc_conf = "narenas:2,dirty_decay_ms:1000";
+}
