@@ -112,10 +112,12 @@ void printTable(const std::vector<Subject>& subjects, const std::vector<unsigned
                 } else {
                     std::printf("%9s %9s %9s", "", "", "");
                 }
-                std::printf(" | %11.0f %9.2f | %10.2f %10.2f\n", medianOf(rounds, &Measurement::rate),
+                std::printf(" | %11.0f %9.2f | %10.2f %10.2f", medianOf(rounds, &Measurement::rate),
                             medianRatio(rounds, echo, &Measurement::rate),
                             medianOf(rounds, &Measurement::clientTime) * 1e6,
                             medianOf(rounds, &Measurement::serverTime) * 1e6);
+                const double lost = medianOf(rounds, &Measurement::lost);
+                std::printf(lost > 0 ? "  %.1f %% of the deliveries given up\n" : "\n", lost * 100);
             }
         }
     }

@@ -150,6 +150,7 @@ Measurement measure(const Subject& subject, unsigned clientCount, Phase phase, s
             .rate = sent / seconds,
             .clientTime = clientUsed / sent,
             .serverTime = serverUsed / sent,
+            .lost = running->lostShare(),
             .measured = true};
 }
 

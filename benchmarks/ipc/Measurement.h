@@ -25,6 +25,7 @@ struct Measurement {
     double rate = 0;       ///< messages a second, of all clients together
     double clientTime = 0; ///< processor seconds per message
     double serverTime = 0; ///< likewise, with all that the server still does when the replies are out
+    double lost = 0;       ///< share of the deliveries that the server gave up, none of which it should
     bool measured = false;
 };
 

@@ -135,6 +135,33 @@ private:
     std::string bytes_;
 };
 
+/// What the service's ledger counts as dropped, of all that it counts as received.
+double lostShareOf(dbus::BlockingConnection& connection) {
+    std::string bytes;
+    const std::uint32_t serial = connection.nextSerial();
+    dbus::MessageWriter writer(bytes);
+    writer.beginCall({.serial = serial,
+                      .path = dbus::kObjectPath,
+                      .interface = dbus::kInspectionInterface,
+                      .member = dbus::kGetLedger});
+    require(writer.finish() && connection.send(bytes), "service: GetLedger");
+    const auto reply = connection.receive(serial, kPatience);
+    requireGoodReply(reply);
+    const Dictionary ledger = dbus::BodyReader(reply->header).dictionary();
+    const ValueRef totals = ledger.find("totals");
+    require(totals.isDictionary(), "service: the ledger has no totals");
+    double received = 0;
+    double kept = 0;
+    for (const auto& [backend, account] : totals.dictionary()) {
+        const Dictionary counts = account.dictionary();
+        received += static_cast<double>(counts.find("received").integerValue());
+        for (const char* const outcome : {"delivered", "queued", "redundant"}) {
+            kept += static_cast<double>(counts.find(outcome).integerValue());
+        }
+    }
+    return received == 0 ? 0 : 1 - kept / received;
+}
+
 class RunningService final : public Running {
 public:
     explicit RunningService(unsigned clients) {
@@ -148,6 +175,12 @@ public:
     RunningService(const RunningService&) = delete;
     RunningService& operator=(const RunningService&) = delete;
     ~RunningService() override { channels_.clear(); }
+
+    double lostShare() override {
+        auto connection = service_.connection();
+        require(connection.has_value(), "service: connect");
+        return lostShareOf(*connection);
+    }
 
 private:
     ServiceProcess service_;

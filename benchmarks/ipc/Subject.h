@@ -32,6 +32,8 @@ public:
     virtual ~Running() = default;
 
     pid_t process() const { return process_; }
+    /// Deliveries that it gave up, of all that it was to make.
+    virtual double lostShare() { return 0; }
     std::vector<std::unique_ptr<Channel>>& channels() { return channels_; }
 
 protected:

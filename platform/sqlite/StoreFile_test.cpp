@@ -254,6 +254,18 @@ TEST_F(StoreFileTest, EveryRowOfAGroupIsStoredWhateverItsSize) {
     }
 }
 
+TEST_F(StoreFileTest, RowsOfManyBytesAreStoredBesideSmallOnes) {
+    const auto file = openFile(64 * kMiB);
+    std::vector<StoreRecord> group;
+    std::vector<std::string> expected;
+    for (const std::size_t bytes : {10U, 300'000U, 10U, 100'000U, 100'000U, 100'000U, 10U}) {
+        group.push_back(record(DeliveryBackend::Beacon, {{"text", std::string_view(std::string(bytes, 'x'))}}));
+        expected.push_back(std::to_string(bytes + 11));
+    }
+    store(*file, group);
+    EXPECT_EQ(queryRows(options_.file.path, "SELECT length(payload) FROM deliveries ORDER BY seq"), expected);
+}
+
 TEST_F(StoreFileTest, RowsThatSayTheSameAreStoredEachUnderItsName) {
     const auto file = openFile(64 * kMiB);
     const Dictionary payload{{"a", 1}, {"b", "text"}};

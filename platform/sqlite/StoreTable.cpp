@@ -77,7 +77,7 @@ bool StoreTable::insert(const StoreRecord& record, const StoreRow& row) {
     ++usage_.rows;
     usage_.bytes +=
         rowBytes(row.values.size(), isNamed(record, row.shape) ? record.name.view().size() : 0, record.bytes.size());
-    return waiting_.size() < kRowsTogether || writeRows();
+    return (waiting_.size() < kRowsTogether && waitingValues_.size() < kBytesTogether) || writeRows();
 }
 
 bool StoreTable::writeRows() {
@@ -93,15 +93,21 @@ bool StoreTable::writeRows() {
             written = written && insert_.run();
         }
     }
-    waiting_.clear();
-    waitingValues_.clear();
+    forgetRows();
     return written;
 }
 
 void StoreTable::rolledBack() {
     usage_ = kept_;
+    forgetRows();
+}
+
+void StoreTable::forgetRows() {
     waiting_.clear();
     waitingValues_.clear();
+    if (waitingValues_.capacity() > 2 * kBytesTogether) {
+        waitingValues_.shrink_to_fit();
+    }
 }
 
 void StoreTable::bind(SqliteStatement& statement, std::size_t place, const WaitingRow& row) {

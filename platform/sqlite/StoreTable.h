@@ -61,6 +61,9 @@ private:
     /// Rows that one statement writes: a statement by itself costs as much as some rows.
     static constexpr std::size_t kRowsTogether = 16;
 
+    /// Values that wait for no more rows.
+    static constexpr std::size_t kBytesTogether = 256 * 1024;
+
     struct WaitingRow {
         const StoreRecord* record = nullptr;
         std::int64_t seq = 0;
@@ -69,6 +72,7 @@ private:
         std::size_t end = 0;
     };
 
+    void forgetRows();
     SqliteStatement prepareInsert(std::size_t rows);
     void bind(SqliteStatement& statement, std::size_t place, const WaitingRow& row);
 
