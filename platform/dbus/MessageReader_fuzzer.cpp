@@ -111,10 +111,19 @@ void readBody(const MessageHeader& header) {
     }
 }
 
+void requireSame(const MessageHeader& one, const MessageHeader& other) {
+    require(one.type == other.type && one.flags == other.flags && one.foreignOrder == other.foreignOrder &&
+            one.serial == other.serial && one.replySerial == other.replySerial && one.path == other.path &&
+            one.interface == other.interface && one.member == other.member && one.errorName == other.errorName &&
+            one.destination == other.destination && one.sender == other.sender && one.signature == other.signature &&
+            one.body.data() == other.body.data() && one.body.size() == other.body.size());
+}
+
 } // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     std::string_view rest(reinterpret_cast<const char*>(data), size);
+    HeaderReader headers;
     while (true) {
         const Frame frame = frameOf(rest);
         if (frame.state != Frame::State::Known || frame.bytes > rest.size()) {
@@ -122,7 +131,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         }
         require(frame.bytes >= kFixedHeaderBytes && frame.headerBytes <= frame.bytes);
         MessageHeader header;
-        const auto error = header.read(rest.substr(0, frame.bytes));
+        const std::string_view message = rest.substr(0, frame.bytes);
+        const auto error = header.read(message);
+        for (int time = 0; time < 2; ++time) { // anew, and as a repetition
+            require(headers.read(message).has_value() == error.has_value());
+            if (!error) {
+                requireSame(headers.header(), header);
+            }
+        }
         if (error) {
             requireText(*error);
             return 0;
