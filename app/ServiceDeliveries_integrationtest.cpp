@@ -205,7 +205,9 @@ TEST_F(ServiceDeliveriesTest, NothingCommittedIsLostWhenTheServiceIsKilledUnderL
         const auto stored = before.find("beacon");
         EXPECT_EQ(total("beacon", "delivered"), stored == before.end() ? 0 : stored->second) << "round " << round;
         EXPECT_EQ(total("beacon", "queued"), 0);
-        expectBalance();
+        if (!before.empty()) { // it may have been killed before its first commit
+            expectBalance();
+        }
     }
 }
 

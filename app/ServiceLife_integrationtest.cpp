@@ -2,6 +2,7 @@
 #include "app/RunningService_integrationtest.h"
 
 #include <filesystem>
+#include <sys/resource.h>
 #include <sys/un.h>
 
 namespace vela {
@@ -121,6 +122,30 @@ TEST(ServiceLifeTest, WhatAClientSentBeforeItClosedIsHandledBeforeItsSessionsEnd
     EXPECT_EQ(service.linesWith("sending message for reporter (42)"), kMessages);
     const std::string log = service.log();
     EXPECT_GT(log.find("ending session 42"), log.rfind("sending message for reporter (42)"));
+}
+
+TEST(ServiceLifeTest, ASoftLimitOfDescriptorsDoesNotBoundItsClients) {
+    rlimit before{};
+    ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+    if (before.rlim_max < 1000) {
+        GTEST_SKIP() << "no more than " << before.rlim_max << " descriptors";
+    }
+    const rlimit narrow{128, before.rlim_max};
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &narrow), 0);
+    RunningService service({"limits.clients_per_user=1000"});
+    const rlimit wide{before.rlim_max, before.rlim_max};
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &wide), 0);
+    {
+        std::vector<ServiceClient> clients;
+        for (int count = 0; count < 300; ++count) {
+            clients.push_back(service.client());
+        }
+        EXPECT_EQ(clients.back().call("createReportingSession", "[42]"), "true");
+        EXPECT_EQ(clients.back().call("startReportingSessionForID", "[42]"), "true");
+        EXPECT_EQ(clients.back().call("stopReportingSessionForID", "[42]"), "true");
+    }
+    EXPECT_EQ(service.linesWith("Too many open files"), 0U);
+    setrlimit(RLIMIT_NOFILE, &before);
 }
 
 TEST(ServiceLifeTest, AStartWaitsForItsBackEndsWhileOthersGoOn) {

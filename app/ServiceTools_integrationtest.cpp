@@ -118,6 +118,12 @@ TEST_F(ServiceToolsTest, AFileWithAFaultSendsNothing) {
     EXPECT_EQ(service_.linesWith("newConnection"), 0U);
 }
 
+TEST_F(ServiceToolsTest, AFolderIsNoFileToRun) {
+    const testing::ProgramRun run = service_.velactl({"run", "/"});
+    EXPECT_EQ(run.status, 1);
+    EXPECT_EQ(run.error, "velactl: / cannot be read to its end\n");
+}
+
 TEST_F(ServiceToolsTest, VelactlShowsSessionsAndStatus) {
     EXPECT_EQ(service_.velactl({"sessions"}).out, "No sessions\n");
     ServiceClient client = service_.client();

@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <filesystem>
+#include <fstream>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sstream>
@@ -59,16 +60,17 @@ TEST_F(DriversCommandTest, EveryGroupIsListedWithItsChannels) {
     publisher->channels()[1].record(3);
     publisher->channels()[1].record(12);
     publisher->channels()[2].enter(0, 1);
-    publisher->channels()[2].enter(1, 1'000'001);
-    publisher->channels()[2].enter(platform::hwstats::kNoState, 4'000'001);
+    // Longer than the test takes, whose time counts as well.
+    publisher->channels()[2].enter(1, 1'000'000'000'001);
+    publisher->channels()[2].enter(platform::hwstats::kNoState, 4'000'000'000'001);
     ASSERT_EQ(run({}), kDone) << error_;
     EXPECT_EQ(error_, "");
     EXPECT_EQ(out_, "GROUP                    DRIVER     CHANNEL  FORMAT     VALUE\n"
                     "Tarn                     -          -        -          no source\n"
                     "Speaker                  My Driver  xruns    counter    5\n"
                     "Speaker                  My Driver  busy     histogram  2 values, 3 to 12 us: 0-10:1 10-20:1\n"
-                    "Speaker                  My Driver  stream   state      idle 1x 1.000 ms 25.0 %, "
-                    "running 1x 3.000 ms 75.0 %\n"
+                    "Speaker                  My Driver  stream   state      idle 1x 1000000.000 ms 25.0 %, "
+                    "running 1x 3000000.000 ms 75.0 %\n"
                     "-/MCA                    -          -        -          no channels\n"
                     "Haptics/Stats            -          -        -          no source\n"
                     "StateTransitionTimes_ms  -          -        -          no channels\n"
@@ -136,8 +138,19 @@ TEST_F(DriversCommandTest, ASourceThatIsNoneIsAWrongSetting) {
 TEST_F(DriversCommandTest, AFolderThatCannotBeReadIsSaidOnce) {
     std::filesystem::remove(folder_ / "hwstats");
     std::filesystem::create_symlink("/dev/null", folder_ / "hwstats");
-    EXPECT_EQ(run({}), kDone);
-    EXPECT_EQ(error_, "velactl: " + (folder_ / "hwstats") + ": cannot be read, error 20\n");
+    EXPECT_EQ(run({}), kFailed);
+    EXPECT_EQ(error_, "velactl: " + (folder_ / "hwstats") + ": cannot be read: Not a directory\n");
+    EXPECT_EQ(run({"--watch", "--count=1"}), kFailed);
+    EXPECT_EQ(error_, "velactl: " + (folder_ / "hwstats") + ": cannot be read: Not a directory\n");
+}
+
+TEST_F(DriversCommandTest, AFileThatIsWrongIsSaidOnceAndTheOthersAreListed) {
+    const auto publisher = publish();
+    std::ofstream(folder_ / "hwstats/wr\nong.channels") << "no channel file, but longer than the header of one would "
+                                                           "be: that takes some more words to write down";
+    EXPECT_EQ(run({}), kFailed);
+    EXPECT_EQ(error_, "velactl: " + (folder_ / "hwstats/wr\\nong.channels") + ": it is no channel file\n");
+    EXPECT_THAT(out_, HasSubstr("Speaker                  My Driver  xruns    counter    0\n"));
 }
 
 } // namespace

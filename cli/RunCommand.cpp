@@ -64,7 +64,7 @@ platform::Result<Step> readStep(std::string_view text) {
     return step;
 }
 
-/// All steps, each tried out: nothing is sent of a file that has a fault.
+/// All steps, each tried out: nothing is sent of a file that has a fault. A failure's text goes behind the file's name.
 platform::Result<std::vector<Step>> readSteps(std::istream& in) {
     std::vector<Step> steps;
     std::string text;
@@ -81,10 +81,13 @@ platform::Result<std::vector<Step>> readSteps(std::istream& in) {
             }
         }
         if (!step) {
-            return platform::Failure{0, std::to_string(line) + ": " + step.failure().description};
+            return platform::Failure{0, ":" + std::to_string(line) + ": " + step.failure().description};
         }
         steps.push_back(*std::move(step));
         steps.back().line = line;
+    }
+    if (in.bad()) {
+        return platform::Failure{0, " cannot be read to its end"};
     }
     return steps;
 }
@@ -202,7 +205,7 @@ int runRun(std::span<const std::string_view> arguments, Console& console) {
     }
     const auto steps = readSteps(file == "-" ? console.in : opened);
     if (!steps) {
-        console.error << "velactl: " << escapedText(file) << ":" << escapedText(steps.failure().description) << '\n';
+        console.error << "velactl: " << escapedText(file) << escapedText(steps.failure().description) << '\n';
         return kFailed;
     }
     auto connection = connectToService(console);

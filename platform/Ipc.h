@@ -66,6 +66,9 @@ public:
 
     /// The peer's process, by the operating system's word.
     virtual std::int32_t processIdentifier() const = 0;
+    /// Whether what was read of the process with this identifier until now was the peer's, and not that of a later one
+    /// which has got the identifier. True where the system cannot tell.
+    virtual bool confirmProcess() const = 0;
     /// On whose behalf the peer connected, by the operating system's word; none where that is not known whole.
     virtual std::optional<Identity> peerIdentity() const = 0;
     virtual void setExportedObject(std::shared_ptr<ReportingServiceProtocol> object) = 0;

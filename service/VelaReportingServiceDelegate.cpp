@@ -89,9 +89,9 @@ bool VelaReportingServiceDelegate::shouldAcceptNewConnection(
         connection->setExportedObject(client);
     }
     // Before the connection is resumed, so that it runs ahead of every call.
-    reportingQueue_->post([weak = weak_from_this(), client] {
+    reportingQueue_->post([weak = weak_from_this(), client, peer = std::weak_ptr(connection)] {
         if (const auto self = weak.lock()) {
-            self->registerClient(client);
+            self->registerClient(client, peer.lock());
         }
     });
     installHandlers(connection, client, context_);
@@ -99,15 +99,19 @@ bool VelaReportingServiceDelegate::shouldAcceptNewConnection(
     return true;
 }
 
-void VelaReportingServiceDelegate::registerClient(const std::shared_ptr<VelaReportingClientServerInstance>& client) {
+void VelaReportingServiceDelegate::registerClient(const std::shared_ptr<VelaReportingClientServerInstance>& client,
+                                                  const std::shared_ptr<platform::IpcConnection>& connection) {
     assert(reportingQueue_->isCurrent());
     {
         const RecursiveMutexLock lock(lock_);
         clients_.push_back(client);
     }
     client->setClientStartDate(context_->platform.clock.now());
-    client->setClientProcessName(
-        VelaReportingUtilityProcessNameForPID(context_->platform.processInformation, client->processIdentifier()));
+    auto name =
+        VelaReportingUtilityProcessNameForPID(context_->platform.processInformation, client->processIdentifier());
+    if (connection == nullptr || connection->confirmProcess()) {
+        client->setClientProcessName(std::move(name));
+    }
 }
 
 // The handlers hold the client weakly: the connection, which holds the handlers, owns it.

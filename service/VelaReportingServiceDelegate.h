@@ -82,7 +82,9 @@ private:
     using Features = std::vector<Dictionary>;
 
     void initialise();
-    void registerClient(const std::shared_ptr<VelaReportingClientServerInstance>& client);
+    /// `connection`: none when it is gone already.
+    void registerClient(const std::shared_ptr<VelaReportingClientServerInstance>& client,
+                        const std::shared_ptr<platform::IpcConnection>& connection);
     static void installHandlers(const std::shared_ptr<platform::IpcConnection>& connection,
                                 const std::shared_ptr<VelaReportingClientServerInstance>& client,
                                 const std::shared_ptr<const VelaReportingServiceContext>& context);

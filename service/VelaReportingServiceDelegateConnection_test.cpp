@@ -65,6 +65,14 @@ TEST_F(VelaReportingServiceDelegateConnectionTest, AClientIsRegisteredOnTheRepor
     onQueue([&] { EXPECT_THAT(service().getAllClients(), ElementsAre(client.instance())); });
 }
 
+TEST_F(VelaReportingServiceDelegateConnectionTest, AProcessThatIsGoneHasNoNameAsItsNumberMayBeAnothers) {
+    const Client client = accept(7);
+    client.connection->loseProcess();
+    queues_.runUntilIdle();
+    EXPECT_NE(client.instance()->clientStartDate(), std::nullopt);
+    EXPECT_EQ(client.instance()->clientProcessName(), std::nullopt);
+}
+
 TEST_F(VelaReportingServiceDelegateConnectionTest, ACallRightAfterAcceptanceFindsItsClientRegistered) {
     const Client client = accept(7);
     EXPECT_EQ(client.create(42), true);

@@ -5,6 +5,7 @@
 #include "platform/Ipc.h"
 #include "platform/Mutex.h"
 
+#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -27,6 +28,8 @@ public:
     void setObserver(std::function<void(std::string_view call)> observer);
     /// Nobody knows the peer's until it is set.
     void setPeerIdentity(std::optional<platform::Identity> identity);
+    /// The peer's process is gone, and its identifier may be another one's.
+    void loseProcess() { processIsLost_ = true; }
 
     // What a test does. Each handler that is not set is passed over.
     /// The exported object; null when there is none, and after the end.
@@ -47,6 +50,7 @@ public:
     std::vector<std::string> calls() const;
 
     std::int32_t processIdentifier() const override { return pid_; }
+    bool confirmProcess() const override { return !processIsLost_; }
     std::optional<platform::Identity> peerIdentity() const override;
     void setExportedObject(std::shared_ptr<platform::ReportingServiceProtocol> object) override;
     void setInterruptionHandler(platform::UniqueFunction<void()> handler) override;
@@ -61,6 +65,7 @@ private:
 
     const std::int32_t pid_;
     const std::string description_;
+    std::atomic<bool> processIsLost_ = false;
     mutable Mutex mutex_;
     std::function<void(std::string_view)> observer_ VELA_GUARDED_BY(mutex_);
     std::vector<std::string> calls_ VELA_GUARDED_BY(mutex_);

@@ -34,7 +34,11 @@ Result<BlockingConnection> BlockingConnection::open(const std::vector<SocketAddr
     if (!descriptor) {
         return descriptor.failure();
     }
-    BlockingConnection connection(*std::move(descriptor));
+    return open(*std::move(descriptor), patience);
+}
+
+Result<BlockingConnection> BlockingConnection::open(FileDescriptor connected, Nanoseconds patience) {
+    BlockingConnection connection(std::move(connected));
     const Result<Done> done = connection.authenticate(patience);
     if (!done) {
         return done.failure();
@@ -43,8 +47,9 @@ Result<BlockingConnection> BlockingConnection::open(const std::vector<SocketAddr
 }
 
 Result<Done> BlockingConnection::authenticate(Nanoseconds patience) {
+    // A service that refuses at once may have gone already, but not its answer.
     const Result<Done> sent = send(ClientAuthentication::opening());
-    if (!sent) {
+    if (!sent && sent.failure().code != ECONNRESET) {
         return sent.failure();
     }
     ClientAuthentication authentication;

@@ -33,6 +33,8 @@ public:
     /// Connects and authenticates. The failure's code is that of the system call, or 0 when the service refused or did
     /// not answer within `patience`.
     static Result<BlockingConnection> open(const std::vector<SocketAddress>& addresses, Nanoseconds patience);
+    /// As above, of a socket that is connected and blocks.
+    static Result<BlockingConnection> open(FileDescriptor connected, Nanoseconds patience);
 
     /// The serial for the next call, never 0 and never the same again.
     std::uint32_t nextSerial() { return ++serial_ == 0 ? ++serial_ : serial_; }

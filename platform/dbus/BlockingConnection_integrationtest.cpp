@@ -45,6 +45,22 @@ TEST(BlockingConnectionTest, AServiceThatSaysNothingIsWaitedForAsLongAsAsked) {
     EXPECT_TRUE(connection.receive(1, kPatience));
 }
 
+TEST(BlockingConnectionTest, ARefusalIsReadAlsoWhereTheServiceHasClosedAlready) {
+    const testing::TemporaryFolder folder;
+    const auto socket = ListeningSocket::create(folder / "socket", 0666);
+    ASSERT_TRUE(socket);
+    FileDescriptor descriptor = *connectTo({{folder / "socket", false}}, true);
+    {
+        const FileDescriptor client(accept4(socket->descriptor(), nullptr, nullptr, SOCK_CLOEXEC));
+        const std::string_view answer = "REJECTED limits.clients_per_user=1\r\n";
+        ASSERT_EQ(::send(client.get(), answer.data(), answer.size(), MSG_NOSIGNAL), std::ssize(answer));
+    }
+    const auto connection = BlockingConnection::open(std::move(descriptor), kPatience);
+    ASSERT_FALSE(connection);
+    EXPECT_EQ(connection.failure().description,
+              "the service refused the connection: REJECTED limits.clients_per_user=1");
+}
+
 TEST(BlockingConnectionTest, AServiceThatEndsIsSeen) {
     RunningEndpoint endpoint;
     BlockingConnection connection = connectionTo(endpoint);

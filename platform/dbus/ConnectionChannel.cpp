@@ -1,5 +1,7 @@
 #include "platform/dbus/ConnectionChannel.h"
 
+#include "platform/dbus/PeerCredentials.h"
+
 #include <cerrno>
 #include <sys/socket.h>
 #include <utility>
@@ -22,6 +24,11 @@ ConnectionChannel::ConnectionChannel(FileDescriptor socket, std::shared_ptr<Even
       registered_(loop_->add(descriptor_, EPOLLIN, token_)),
       socket_(std::move(socket)),
       watched_(registered_) {}
+
+bool ConnectionChannel::confirmPeer() const {
+    const MutexLock lock(mutex_);
+    return !socket_ || !peerIsGone(descriptor_);
+}
 
 void ConnectionChannel::sendBytes(std::string_view bytes) {
     const MutexLock lock(mutex_);
@@ -75,13 +82,13 @@ void ConnectionChannel::watch(bool reading, bool writing) {
     writing_ = writing;
 }
 
-void ConnectionChannel::callEnds() {
+void ConnectionChannel::callEnds(std::uint64_t bytes) {
     const MutexLock lock(mutex_);
-    end();
+    end(bytes);
 }
 
-void ConnectionChannel::end() {
-    const bool wasLast = inFlight_.fetch_sub(1, std::memory_order_relaxed) == 1;
+void ConnectionChannel::end(std::uint64_t bytes) {
+    const bool wasLast = underWay_.fetch_sub(underWay(bytes), std::memory_order_relaxed) == underWay(bytes);
     if (gathering_ && !looking_ && wasLast) {
         flush();
         loop_->ring(token_);
@@ -153,7 +160,7 @@ void ConnectionChannel::endGathering() {
 
 void ConnectionChannel::resumeIfPossible() {
     // Not at the first free place: reading in runs costs fewer wake-ups.
-    if (paused_ && !held_ && inFlight() <= limits_.callsInFlight / 2 && unsent() <= limits_.unsentBytes / 2) {
+    if (paused_ && !held_ && isHalfEmpty() && unsent() <= limits_.unsentBytes / 2) {
         paused_ = false;
         watch(true, writing_);
         loop_->ring(token_);

@@ -26,6 +26,7 @@ namespace vela::platform::dbus {
 struct ChannelLimits {
     std::size_t unsentBytes = 0;
     std::uint32_t callsInFlight = 0;
+    std::uint64_t callBytes = 0; ///< of the calls in flight
 };
 
 class ConnectionChannel {
@@ -39,6 +40,9 @@ public:
     /// Whether the loop watches the socket; if not, the connection must be given up.
     bool registered() const { return registered_; }
 
+    /// Whether the process at the other end is still the one that connected; true where that cannot be told.
+    bool confirmPeer() const;
+
     /// Sends bytes as they are: for the authentication.
     void sendBytes(std::string_view bytes);
 
@@ -49,16 +53,16 @@ public:
         append(write);
         flushUnlessGathering();
     }
-    /// For the endpoint's thread.
-    void callBegins() { inFlight_.fetch_add(1, std::memory_order_relaxed); }
+    /// For the endpoint's thread. A call of so many bytes.
+    void callBegins(std::uint64_t bytes) { underWay_.fetch_add(underWay(bytes), std::memory_order_relaxed); }
     /// Sends a call's answer, as `send`, and ends the call.
     template <class Write>
-    void callEnds(const Write& write) {
+    void callEnds(std::uint64_t bytes, const Write& write) {
         const MutexLock lock(mutex_);
         append(write);
-        end();
+        end(bytes);
     }
-    void callEnds();
+    void callEnds(std::uint64_t bytes);
 
     /// Whether the next message may be dispatched. If not, reading stops, and the loop is rung when it may.
     bool mayProceed();
@@ -77,7 +81,7 @@ public:
     void endGathering();
     /// Whether the next message may be dispatched; nobody is told when it may.
     bool hasRoom() const;
-    std::uint32_t inFlight() const { return inFlight_.load(std::memory_order_relaxed); }
+    std::uint32_t inFlight() const { return callsOf(underWay_.load(std::memory_order_relaxed)); }
 
     /// The socket takes bytes again.
     void writable();
@@ -100,12 +104,28 @@ private:
             noteOpen();
         }
     }
-    void end() VELA_REQUIRES(mutex_);
+    // Calls under way and their bytes are one number, so that a call changes both in one step.
+    static constexpr unsigned kCallBits = 24;
+    static constexpr std::uint64_t underWay(std::uint64_t bytes) { return bytes << kCallBits | 1U; }
+    static constexpr std::uint32_t callsOf(std::uint64_t underWay) {
+        return static_cast<std::uint32_t>(underWay & ((1U << kCallBits) - 1U));
+    }
+    static constexpr std::uint64_t bytesOf(std::uint64_t underWay) { return underWay >> kCallBits; }
+    /// One call may be larger than all may be together.
+    bool hasRoomForCall() const {
+        const std::uint64_t underWay = underWay_.load(std::memory_order_relaxed);
+        return callsOf(underWay) < limits_.callsInFlight && bytesOf(underWay) < limits_.callBytes;
+    }
+    bool isHalfEmpty() const {
+        const std::uint64_t underWay = underWay_.load(std::memory_order_relaxed);
+        return callsOf(underWay) <= limits_.callsInFlight / 2 && bytesOf(underWay) <= limits_.callBytes / 2;
+    }
+    void end(std::uint64_t bytes) VELA_REQUIRES(mutex_);
     void flushUnlessGathering() VELA_REQUIRES(mutex_);
     std::uint32_t nextSerial() VELA_REQUIRES(mutex_) { return ++serial_ == 0 ? ++serial_ : serial_; }
     std::size_t unsent() const VELA_REQUIRES(mutex_) { return output_.size() - sent_; }
     /// Without the lock, which each reply takes; only a hint as far as `open_` goes.
-    bool belowLimits() const { return open_.load(std::memory_order_acquire) && inFlight() < limits_.callsInFlight; }
+    bool belowLimits() const { return open_.load(std::memory_order_acquire) && hasRoomForCall(); }
     void noteOpen() VELA_REQUIRES(mutex_);
     void flush() VELA_REQUIRES(mutex_);
     void discardOutput() VELA_REQUIRES(mutex_);
@@ -119,8 +139,8 @@ private:
     const int descriptor_;
     bool registered_ = false;
 
-    /// Calls under way. It grows on the endpoint's thread alone, and becomes less with the lock held.
-    std::atomic<std::uint32_t> inFlight_ = 0;
+    /// It grows on the endpoint's thread alone, and becomes less with the lock held.
+    std::atomic<std::uint64_t> underWay_ = 0;
     /// Whether neither `held_` nor bytes that wait are in the way. Changes with the lock held.
     std::atomic<bool> open_ = false;
 

@@ -1,8 +1,12 @@
 #include "platform/dbus/PeerCredentials.h"
 
+#include "platform/linux/FileDescriptor.h"
+
 #include <algorithm>
 #include <cerrno>
 #include <sys/socket.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 namespace vela::platform::dbus {
 
@@ -56,11 +60,15 @@ Result<PeerCredentials> peerCredentials(int socket) {
     return peer;
 }
 
-FileDescriptor peerProcessDescriptor(int socket) {
+bool peerIsGone(int socket) {
     int descriptor = -1;
     socklen_t bytes = sizeof(descriptor);
-    const bool known = getsockopt(socket, SOL_SOCKET, kPeerPidfdOption, &descriptor, &bytes) == 0;
-    return FileDescriptor(known ? descriptor : -1);
+    if (getsockopt(socket, SOL_SOCKET, kPeerPidfdOption, &descriptor, &bytes) != 0) {
+        return errno == ESRCH || errno == EINVAL; // by the kernel's version
+    }
+    const FileDescriptor process(descriptor);
+    // No signal: only whether there is somebody to send one to.
+    return syscall(SYS_pidfd_send_signal, process.get(), 0, nullptr, 0) != 0 && errno == ESRCH;
 }
 
 } // namespace vela::platform::dbus

@@ -4,7 +4,6 @@
 
 #include "platform/Identity.h"
 #include "platform/Result.h"
-#include "platform/linux/FileDescriptor.h"
 
 #include <cstdint>
 #include <optional>
@@ -26,8 +25,8 @@ struct PeerCredentials {
 
 Result<PeerCredentials> peerCredentials(int socket);
 
-/// A descriptor of the peer's process, which no later process can be taken for; none where the kernel has none to give
-/// (before Linux 6.5) or the peer is gone.
-FileDescriptor peerProcessDescriptor(int socket);
+/// Whether the process that called connect() is gone for good, so that its identifier may be another one's. False where
+/// the kernel cannot tell (before Linux 6.5).
+bool peerIsGone(int socket);
 
 } // namespace vela::platform::dbus

@@ -54,7 +54,8 @@ void PendingCall::answerError(const IpcError& error) {
 std::shared_ptr<void> PendingCall::countByToken() {
     counted_ = false;
     // The pointer keeps the channel for its deleter; what it points to means nothing.
-    return std::shared_ptr<void>(channel_.get(), [channel = channel_](void*) { channel->callEnds(); });
+    return std::shared_ptr<void>(channel_.get(),
+                                 [channel = channel_, bytes = bytes_](void*) { channel->callEnds(bytes); });
 }
 
 IpcReply<bool> booleanReply(PendingCall call) {

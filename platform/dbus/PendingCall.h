@@ -20,8 +20,9 @@ public:
     PendingCall(std::shared_ptr<ConnectionChannel> channel, const MessageHeader& header)
         : channel_(std::move(channel)),
           serial_(header.serial),
+          bytes_(static_cast<std::uint32_t>(header.body.size())),
           replyExpected_(header.replyExpected()) {
-        channel_->callBegins();
+        channel_->callBegins(bytes_);
     }
     PendingCall(PendingCall&& other) noexcept = default;
     PendingCall& operator=(PendingCall&&) = delete;
@@ -53,7 +54,7 @@ public:
     void drop() {
         const auto channel = std::exchange(channel_, nullptr);
         if (channel != nullptr && counted_) {
-            channel->callEnds();
+            channel->callEnds(bytes_);
         }
     }
 
@@ -70,16 +71,17 @@ private:
             return;
         }
         if (replyExpected_ && counted_) {
-            channel->callEnds(write);
+            channel->callEnds(bytes_, write);
         } else if (replyExpected_) {
             channel->send(write);
         } else if (counted_) {
-            channel->callEnds();
+            channel->callEnds(bytes_);
         }
     }
 
     std::shared_ptr<ConnectionChannel> channel_; ///< none once answered
     std::uint32_t serial_;
+    std::uint32_t bytes_; ///< of its arguments
     bool replyExpected_;
     bool counted_ = true;
 };

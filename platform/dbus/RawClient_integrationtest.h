@@ -7,6 +7,7 @@
 #include "platform/linux/FileDescriptor.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <chrono>
 #include <cstring>
@@ -122,6 +123,11 @@ public:
     bool somethingToRead() const {
         pollfd poll{socket_.get(), POLLIN, 0};
         return ::poll(&poll, 1, 0) > 0;
+    }
+    void dropWhatIsThere() const {
+        std::array<char, 16 * 1024> bytes;
+        while (recv(socket_.get(), bytes.data(), bytes.size(), MSG_DONTWAIT) > 0) {
+        }
     }
     void close() { socket_ = FileDescriptor(); }
     int descriptor() const { return socket_.get(); }

@@ -19,8 +19,7 @@ constexpr std::size_t kKeptBytes = 4 * 1024;
 ServiceConnection::ServiceConnection(ConnectionSetup setup)
     : channel_(std::move(setup.channel)),
       messageBytes_(setup.messageBytes),
-      refused_(!setup.refusal.empty()),
-      process_(std::move(setup.process)) {
+      refused_(!setup.refusal.empty()) {
     target_.facts = setup.facts;
     target_.connection = setup.number;
     authentication_.emplace(setup.peer.user, setup.serverId, std::move(setup.refusal));
@@ -56,11 +55,12 @@ ServiceConnection::Turn ServiceConnection::turn(std::span<char> scratch, IpcList
     if (gathering_ && !std::exchange(looking_, true)) {
         delivered_ = channel_->beginLook();
     }
+    atLimit_ = false;
     takeBuffered(delegate);
     if (ending_) {
         return Turn::Ended;
     }
-    if (state_ == State::Open && !mayProceed()) {
+    if (stopsAtLimit()) {
         return endLook(true);
     }
     return budget_ == 0 ? Turn::More : readOnce(scratch, delegate);
@@ -72,6 +72,10 @@ bool ServiceConnection::mayProceed() const {
     }
     return gathering_ ? channel_->hasRoom() : channel_->mayProceed();
 }
+
+/// Whether a limit ends this turn. Calls end on other threads at any time: where one made room only behind `take`,
+/// what `take` left is still there, and nobody but this turn knows.
+bool ServiceConnection::stopsAtLimit() const { return atLimit_ || (state_ == State::Open && !mayProceed()); }
 
 /// How it goes on when all that was received has been dispatched, or, at a limit, some of it must wait.
 ServiceConnection::Turn ServiceConnection::endLook(bool atLimit) {
@@ -127,7 +131,7 @@ ServiceConnection::Turn ServiceConnection::readOnce(std::span<char> scratch, Ipc
     if (ending_) {
         return Turn::Ended;
     }
-    if (state_ == State::Open && !mayProceed()) {
+    if (stopsAtLimit()) {
         return endLook(true);
     }
     return budget_ == 0 || hungUp_ ? Turn::More : endLook();
@@ -155,8 +159,14 @@ void ServiceConnection::take(std::string_view& bytes, IpcListenerDelegate& deleg
             const std::size_t now = std::min<std::uint64_t>(skipped_, bytes.size());
             bytes.remove_prefix(now);
             skipped_ -= now;
-        } else if (state_ == State::Authenticating ? !takeAuthentication(bytes, delegate)
-                                                   : !mayProceed() || !takeMessage(bytes)) {
+        } else if (state_ == State::Authenticating) {
+            if (!takeAuthentication(bytes, delegate)) {
+                return;
+            }
+        } else if (!mayProceed()) {
+            atLimit_ = true;
+            return;
+        } else if (!takeMessage(bytes)) {
             return;
         }
     }
@@ -254,7 +264,7 @@ void ServiceConnection::end() {
     if (wasOpen && handlers.invalidation) {
         handlers.invalidation();
     }
-    target_.object = nullptr; // held until the handlers have run
+    target_.object = nullptr;
 }
 
 void ServiceConnection::abandon() {
@@ -265,14 +275,20 @@ void ServiceConnection::abandon() {
 // Answers the handlers, which are destroyed without being called otherwise.
 ServiceConnection::Handlers ServiceConnection::close() {
     state_ = State::Ended;
+    if (std::exchange(gathering_, false)) {
+        channel_->endGathering(); // what was answered is sent
+    }
     channel_->close();
-    process_ = FileDescriptor();
     received_ = std::string();
     Handlers handlers;
-    const MutexLock lock(mutex_);
-    std::swap(handlers.interruption, interruption_);
-    std::swap(handlers.invalidation, invalidation_);
-    object_ = nullptr;
+    std::shared_ptr<ReportingServiceProtocol> object;
+    {
+        const MutexLock lock(mutex_);
+        std::swap(handlers.interruption, interruption_);
+        std::swap(handlers.invalidation, invalidation_);
+        std::swap(object, object_);
+    }
+    target_.object = std::move(object); // the handlers may count on it
     return handlers;
 }
 

@@ -27,7 +27,6 @@ namespace vela::platform::dbus {
 struct ConnectionSetup {
     std::uint64_t number = 0; ///< never used again
     PeerCredentials peer;
-    FileDescriptor process; ///< the peer's, or none
     std::shared_ptr<ConnectionChannel> channel;
     const ServiceFacts* facts = nullptr; ///< outlives the endpoint's hold on the connection
     std::uint64_t messageBytes = 0;      ///< the longest message that is taken
@@ -41,6 +40,7 @@ public:
 
     std::int32_t processIdentifier() const override { return target_.peer.processIdentifier; }
     std::optional<Identity> peerIdentity() const override { return target_.peer.identity(); }
+    bool confirmProcess() const override { return channel_->confirmPeer(); }
     void setExportedObject(std::shared_ptr<ReportingServiceProtocol> object) override;
     void setInterruptionHandler(UniqueFunction<void()> handler) override;
     void setInvalidationHandler(UniqueFunction<void()> handler) override;
@@ -71,8 +71,6 @@ public:
     bool isRefused() const { return refused_; }
     std::uint32_t user() const { return target_.peer.user; }
     std::uint64_t number() const { return target_.connection; }
-    /// The peer's process, or none; until `end`.
-    int processDescriptor() const { return process_.get(); }
 
     bool queued = false; ///< for its next turn, by the endpoint
     bool soon = false;   ///< for its next look, by the endpoint
@@ -96,6 +94,7 @@ private:
     };
     Handlers close();
     bool mayProceed() const;
+    bool stopsAtLimit() const;
     Turn readOnce(std::span<char> scratch, IpcListenerDelegate& delegate);
     Turn endLook(bool atLimit = false);
     void takeBuffered(IpcListenerDelegate& delegate);
@@ -111,7 +110,6 @@ private:
     const bool refused_;
 
     // The endpoint's thread's.
-    FileDescriptor process_;
     CallTarget target_;
     State state_ = State::Authenticating;
     std::optional<ServerAuthentication> authentication_;
@@ -122,6 +120,7 @@ private:
     int budget_ = 0;            ///< messages that this turn may still dispatch
     bool ending_ = false;       ///< what is left is not wanted
     bool broken_ = false;       ///< the bytes are no messages
+    bool atLimit_ = false;      ///< a limit made this turn leave what was received
     bool hungUp_ = false;
     bool gathering_ = false;
     bool looking_ = false;   ///< while it gathers: between the begin of a look and its end

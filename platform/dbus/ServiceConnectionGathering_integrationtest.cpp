@@ -25,7 +25,7 @@ protected:
         setup.number = kNumber;
         setup.peer = *peerCredentials(socket.get());
         channel_ = std::make_shared<ConnectionChannel>(std::move(socket), loop_, kNumber,
-                                                       ChannelLimits{1024 * 1024, kCallsInFlight});
+                                                       ChannelLimits{1024 * 1024, kCallsInFlight, 1024 * 1024});
         setup.channel = channel_;
         setup.facts = &facts_;
         setup.messageBytes = 1024 * 1024;
@@ -203,6 +203,65 @@ TEST_F(ServiceConnectionGatheringTest, AtTheLimitItGoesOnWhileRepliesAreSent) {
     EXPECT_TRUE(loopSeesSomething());
     turns();
     EXPECT_EQ(service_->takeReplies().size(), kCallsInFlight);
+}
+
+/// Tells another thread when the last call that fits is under way.
+class FullService final : public RecordingService {
+public:
+    using RecordingService::RecordingService;
+    void stopReportingSessionForID(std::int64_t id, IpcReply<bool> reply) override {
+        ++calls;
+        if (id == kLastThatFits) {
+            full = true; // what follows takes about as long as the other thread
+        }
+        RecordingService::stopReportingSessionForID(id, std::move(reply));
+    }
+    static constexpr std::int64_t kLastThatFits = 1000;
+    std::uint32_t calls = 0;
+    std::atomic<bool> full = false;
+};
+
+// The moment that matters is a few nanoseconds wide, and the other thread tries to meet it: a little later each time.
+TEST_F(ServiceConnectionGatheringTest, ACallThatEndsRightBehindALookThatStoppedAtTheLimitLosesNoneThatIsLeft) {
+    constexpr std::uint32_t kBefore = kCallsInFlight - 2;
+    const auto service = std::make_shared<FullService>(journal_);
+    service->keepReplies();
+    connection_->setExportedObject(service);
+    const auto sendCall = [this](std::int64_t id) { client_->send(simpleCall("stopReportingSessionForID", id)); };
+    for (int round = 0; round < 1000; ++round) {
+        service->calls = 0;
+        sendCalls(1, kBefore);
+        ASSERT_EQ(turns(), Turn::Soon);
+        auto replies = service->takeReplies();
+        std::thread answering([&service, first = std::move(replies.front()), round]() mutable {
+            while (!service->full) {
+            }
+            for (std::atomic<int> spent = 0; spent < round % 100; ++spent) {
+            }
+            first();
+        });
+        sendCall(1);
+        sendCall(FullService::kLastThatFits);
+        sendCall(2);
+        sendCall(3);
+        const Turn turn = turns();
+        answering.join();
+        service->full = false;
+        for (auto reply = replies.begin() + 1; reply != replies.end(); ++reply) {
+            (*reply)();
+        }
+        if (turn == Turn::Waiting && service->calls < kBefore + 4) {
+            ASSERT_TRUE(loopSeesSomething()) << "round " << round << ": nobody tells that calls are left";
+        }
+        turns();
+        EXPECT_EQ(service->calls, kBefore + 4);
+        for (auto& reply : service->takeReplies()) {
+            reply();
+        }
+        turns();
+        loop_->takeRung();
+        client_->dropWhatIsThere();
+    }
 }
 
 TEST_F(ServiceConnectionGatheringTest, AClientThatHangsUpIsDispatchedToTheEnd) {

@@ -4,9 +4,11 @@
 // Limits, and what becomes of a client that passes them:
 //  - authentication: closed when it takes longer;
 //  - users that may not connect, and connections beyond clientsPerUser: the answer to AUTH is "REJECTED access-denied"
-//    or "REJECTED limits.clients_per_user=N", and the connection is closed. The delegate never sees them;
+//    or "REJECTED limits.clients_per_user=N", and the connection is closed. The delegate never sees them. The same with
+//    "REJECTED too-many-open-files" while the process has hardly a descriptor left;
 //  - messageBytes, valueDepth, sessionsPerClient: that call is answered with LimitsExceeded, nothing else happens;
-//  - callsInFlight, unsentReplies: the client is not read from until it is below the half again.
+//  - callsInFlight, messageBytes for all calls in flight together, unsentReplies: the client is not read from until it
+//    is below the half again.
 #pragma once
 
 #include "platform/Ipc.h"
@@ -47,9 +49,6 @@ struct DbusServiceOptions {
     std::uint32_t callsInFlight = 64;              ///< of one client
     std::chrono::milliseconds authentication{5000};
 
-    /// Whether each connection holds a descriptor of its client's process (where the kernel gives one), which costs as
-    /// many descriptors again.
-    bool holdProcessDescriptors = false;
     /// Whether SIGTERM and SIGINT end `resume`. Other threads must have them blocked: see blockEndSignals.
     bool endsOnSignals = true;
     /// Called on the endpoint's thread after each round of events; may be none.

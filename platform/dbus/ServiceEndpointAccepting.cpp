@@ -1,7 +1,10 @@
 // How connections come to be: accepted, refused, or left waiting while no descriptor is left.
 #include "platform/dbus/ServiceEndpoint.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <cstdint>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <utility>
 
@@ -16,6 +19,16 @@ constexpr int kAcceptedPerTurn = 16;
 constexpr std::uint32_t kLingeringRefusals = 32;
 /// How long to wait when no descriptor is left and no connection ends.
 constexpr auto kWithoutDescriptors = 500ms;
+
+/// What the service itself needs: files that sessions write, the store's, processes to ask for their name.
+constexpr rlim_t kOwnDescriptors = 64;
+
+/// The number from which on descriptors are the service's own.
+std::uint64_t descriptorsForClients() {
+    rlimit limit{};
+    getrlimit(RLIMIT_NOFILE, &limit);
+    return limit.rlim_cur - std::min(kOwnDescriptors, limit.rlim_cur / 2);
+}
 
 bool isLackOfResources(int error) { return error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM; }
 
@@ -66,7 +79,9 @@ void DbusServiceEndpoint::admit(FileDescriptor socket) {
     if (!peer) {
         return;
     }
-    std::string refusal = refusalOf(*peer);
+    // The system gives the lowest free number.
+    const bool isLate = static_cast<std::uint64_t>(socket.get()) >= descriptorsForClients();
+    std::string refusal = isLate ? "too-many-open-files" : refusalOf(*peer);
     if (!refusal.empty()) {
         ++refused_;
         if (lingering_ >= kLingeringRefusals) {
@@ -84,12 +99,10 @@ void DbusServiceEndpoint::addConnection(FileDescriptor socket, dbus::PeerCredent
     dbus::ConnectionSetup setup;
     setup.number = nextNumber_;
     setup.peer = std::move(peer);
-    if (options_.holdProcessDescriptors) {
-        setup.process = dbus::peerProcessDescriptor(socket.get());
-    }
-    setup.channel = std::make_shared<dbus::ConnectionChannel>(
-        std::move(socket), loop_, nextNumber_,
-        dbus::ChannelLimits{static_cast<std::size_t>(options_.unsentReplies), options_.callsInFlight});
+    setup.channel =
+        std::make_shared<dbus::ConnectionChannel>(std::move(socket), loop_, nextNumber_,
+                                                  dbus::ChannelLimits{static_cast<std::size_t>(options_.unsentReplies),
+                                                                      options_.callsInFlight, options_.messageBytes});
     if (!setup.channel->registered()) {
         return;
     }

@@ -100,6 +100,50 @@ TEST(ServiceEndpointLifeTest, BytesThatAreNoMessageInterruptAndInvalidate) {
     }
 }
 
+/// Its object is the connection's alone.
+class LoneObjectDelegate final : public IpcListenerDelegate {
+public:
+    explicit LoneObjectDelegate(Journal& journal) : journal_(journal) {}
+
+    bool shouldAcceptNewConnection(const std::shared_ptr<IpcConnection>& connection) override {
+        const auto object = std::make_shared<RecordingService>(journal_);
+        connection->setExportedObject(object);
+        connection->setInvalidationHandler([this, weak = std::weak_ptr(object)] {
+            journal_.add(weak.expired() ? "invalidated without its object" : "invalidated");
+        });
+        connection->resume();
+        return true;
+    }
+
+private:
+    Journal& journal_;
+};
+
+TEST(ServiceEndpointLifeTest, TheObjectLivesUntilTheInvalidationHandlerHasRunAlsoWhereNothingWasCalled) {
+    for (const bool broken : {false, true}) {
+        const testing::TemporaryFolder folder;
+        Journal journal;
+        LoneObjectDelegate delegate(journal);
+        DbusServiceOptions options;
+        options.socketPath = folder / "socket";
+        options.endsOnSignals = false;
+        const auto endpoint = *DbusServiceEndpoint::open(std::move(options));
+        endpoint->setDelegate(delegate);
+        std::thread thread([&endpoint] { EXPECT_TRUE(endpoint->resume()); });
+        {
+            RawClient client(folder / "socket");
+            client.authenticate();
+            client.send(broken ? "no message, but as long as the header of one" : "");
+            if (broken) {
+                EXPECT_TRUE(client.atEnd());
+            }
+        }
+        EXPECT_THAT(journal.waitFor(1), ElementsAre("invalidated"));
+        endpoint->stop();
+        thread.join();
+    }
+}
+
 TEST(ServiceEndpointLifeTest, CallsThatWereSentBeforeTheEndAllArrive) {
     RunningEndpoint endpoint;
     // More calls than may be under way, and none is answered while they are sent.

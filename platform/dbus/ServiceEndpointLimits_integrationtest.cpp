@@ -172,6 +172,45 @@ TEST(ServiceEndpointLimitsTest, OnlySoManyCallsAreUnderWay) {
     }
 }
 
+TEST(ServiceEndpointLimitsTest, CallsUnderWayAreBoundedInBytesToo) {
+    DbusServiceOptions options;
+    options.messageBytes = 10'000;
+    RunningEndpoint endpoint(std::move(options));
+    endpoint.service->keepReplies();
+    RawClient client = endpoint.client();
+    const std::string text(4'000, 'x');
+    for (std::uint32_t serial = 1; serial <= 10; ++serial) {
+        client.send(sendMessageCall({{"text", std::string_view(text)}}, std::nullopt, serial));
+    }
+    endpoint.journal.waitFor(4);
+    RawClient other = endpoint.client();
+    EXPECT_EQ(other.call(callOf("Ping", "", Bytes(), 7, 0, kPeerInterface)).error(), "");
+    EXPECT_EQ(endpoint.service->messages().size(), 3U) << "12,000 bytes and a bit";
+    std::size_t answered = 0;
+    while (answered < 10) {
+        for (auto& reply : endpoint.service->takeReplies()) {
+            reply();
+            EXPECT_EQ(client.readMessage().header.replySerial, ++answered);
+        }
+    }
+}
+
+TEST(ServiceEndpointLimitsTest, ACallMayBeAsLargeAsAllTogether) {
+    DbusServiceOptions options;
+    options.messageBytes = 10'000;
+    RunningEndpoint endpoint(std::move(options));
+    RawClient client = endpoint.client();
+    const std::string text(9'700, 'x');
+    for (std::uint32_t serial = 1; serial <= 5; ++serial) {
+        client.send(sendMessageCall({{"text", std::string_view(text)}}, std::nullopt, serial));
+    }
+    for (std::uint32_t serial = 1; serial <= 5; ++serial) {
+        const Received reply = client.readMessage();
+        EXPECT_EQ(reply.header.replySerial, serial);
+        EXPECT_EQ(reply.error(), "");
+    }
+}
+
 TEST(ServiceEndpointLimitsTest, AStartCountsUntilItsTokenIsGone) {
     DbusServiceOptions options;
     options.callsInFlight = 2;
@@ -315,6 +354,27 @@ void serveMany(std::size_t clients) {
         EXPECT_EQ(endpoint.journal.count("invalidated"), clients);
     }
     setrlimit(RLIMIT_NOFILE, &before);
+}
+
+TEST(ServiceEndpointLimitsTest, WithFewDescriptorsLeftClientsAreRefusedInWords) {
+    RunningEndpoint endpoint;
+    RawClient first = endpoint.client();
+    rlimit descriptors{};
+    ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &descriptors), 0);
+    const rlimit before = descriptors;
+    const FileDescriptor next(dup(0));
+    // Room for some more, which are the service's own.
+    descriptors.rlim_cur = static_cast<rlim_t>(next.get()) + 6;
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &descriptors), 0);
+    {
+        RawClient refused(endpoint.path());
+        refused.send("\0AUTH EXTERNAL\r\n"sv);
+        EXPECT_EQ(refused.readLine(), "REJECTED too-many-open-files");
+        EXPECT_TRUE(refused.atEnd());
+    }
+    EXPECT_EQ(first.call(simpleCall("stopReportingSessionForID", 1)).error(), "") << "who is there is served";
+    setrlimit(RLIMIT_NOFILE, &before);
+    EXPECT_EQ(endpoint.client().call(simpleCall("stopReportingSessionForID", 1)).error(), "");
 }
 
 TEST(ServiceEndpointLimitsTest, AThousandClientsAreServed) { serveMany(1000); }
