@@ -51,7 +51,7 @@ void VelaReportingTallyBridge::handleEvent(const Dictionary& message, std::uint3
     std::size_t payloadBytes = 0;
     for (const std::string& eventName : eventNames) {
         if (tally_.tallyIsEventUsed(eventName)) {
-            payloadBytes = payloadBytes == 0 ? memoryOf(Value(message)) : payloadBytes;
+            payloadBytes = payloadBytes == 0 ? memoryOf(message) : payloadBytes;
             tally_.tallySendEventLazy(
                 eventName, [message, session] { return payloadOf(message, session.get()); }, payloadBytes);
         }

@@ -11,7 +11,7 @@ target_compile_options(vela_options INTERFACE
   # Log lines carry the file's name and the journal its path: relative to the project, whoever builds it.
   -ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "Clang")
-  target_compile_options(vela_options INTERFACE -Wthread-safety -Werror=thread-safety -Wextra-semi)
+  target_compile_options(vela_options INTERFACE -Wthread-safety -Werror=thread-safety -Wextra-semi -fsized-deallocation)
 else()
   target_compile_options(vela_options INTERFACE -Wduplicated-cond -Wlogical-op)
 endif()

@@ -101,7 +101,10 @@ void VelaReportingClientServerInstance::setConfiguration(Dictionary configuratio
             const LogReporterScope scope(forReporterID);
             serviceLog().debug("setting configuration");
             if (const auto session = findReportingSessionForID(forReporterID, false)) {
-                session->updateConfigurationWithContentsOfConfiguration(configuration);
+                if (const auto refusal = session->updateConfigurationWithContentsOfConfiguration(configuration)) {
+                    reply(platform::IpcError{{}, 0, refusal->description}, false);
+                    return;
+                }
             }
             reply(std::nullopt, true);
         });

@@ -44,6 +44,18 @@ TEST_F(VelaReportingClientServerInstanceLimitsTest, ABroadcastIsAnsweredWithTheL
     EXPECT_EQ(send(client, longMessage_, std::nullopt)->limit, "limits.session_bytes is 4 KiB");
 }
 
+TEST_F(VelaReportingClientServerInstanceLimitsTest, AConfigurationThatASessionRefusesIsAnsweredWithTheLimit) {
+    const Client client = connect(7);
+    client.create(1);
+    const auto answer = newAnswer<bool>();
+    client.operations().setConfiguration(longMessage_, 1, Answer<bool>::into(answer));
+    queues_.runUntilIdle();
+    EXPECT_EQ(answer->calls, 1);
+    EXPECT_EQ(answer->limit, "limits.session_bytes is 4 KiB");
+    EXPECT_EQ(client.session(1)->configuration(), Dictionary());
+    EXPECT_EQ(client.setConfiguration({{"a", 1}}, 1), true);
+}
+
 } // namespace
 
 } // namespace vela

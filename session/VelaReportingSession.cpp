@@ -153,7 +153,7 @@ std::optional<platform::Failure> VelaReportingSession::shapeAndSend(const Dictio
     VelaReportingSessionShare listShare;
     VelaReportingSessionShare beaconShare;
     if (budget_ != nullptr) {
-        const std::uint64_t bytes = memoryOf(Value(tagged));
+        const std::uint64_t bytes = memoryOf(tagged);
         if (const auto limit = budget_->take(isForwarded ? 2 * bytes : bytes, limits == Limits::Lifted)) {
             item.drop(DropReason::Limit);
             return refuse(*limit);
@@ -185,12 +185,15 @@ std::optional<platform::Failure> VelaReportingSession::shapeAndSend(const Dictio
     return std::nullopt;
 }
 
-platform::Failure VelaReportingSession::refuse(VelaReportingMemoryLimit limit) {
+std::string VelaReportingSession::textOf(VelaReportingMemoryLimit limit) const {
     const VelaReportingSessionLimits& all = budget_->memory().limits();
     const bool own = limit == VelaReportingMemoryLimit::SessionBytes;
-    const std::string text =
-        formatText("limits.%s is %@", own ? "session_bytes" : "total_bytes",
-                   byteSizeText(static_cast<std::int64_t>(own ? all.sessionBytes : all.totalBytes)));
+    return formatText("limits.%s is %@", own ? "session_bytes" : "total_bytes",
+                      byteSizeText(static_cast<std::int64_t>(own ? all.sessionBytes : all.totalBytes)));
+}
+
+platform::Failure VelaReportingSession::refuse(VelaReportingMemoryLimit limit) {
+    const std::string text = textOf(limit);
     if (!refusalTold_.exchange(true)) {
         sessionLog().error("reporter %lli keeps no more messages: %@", reporterID_, text);
     }
@@ -220,15 +223,26 @@ Dictionary VelaReportingSession::configuration() const {
     return configuration_;
 }
 
-void VelaReportingSession::setConfiguration(const std::optional<Dictionary>& configuration) {
-    if (configuration) {
-        updateConfigurationWithContentsOfConfiguration(*configuration);
-    }
+std::optional<platform::Failure>
+VelaReportingSession::setConfiguration(const std::optional<Dictionary>& configuration) {
+    return configuration ? updateConfigurationWithContentsOfConfiguration(*configuration) : std::nullopt;
 }
 
-void VelaReportingSession::updateConfigurationWithContentsOfConfiguration(const Dictionary& configuration) {
+std::optional<platform::Failure>
+VelaReportingSession::updateConfigurationWithContentsOfConfiguration(const Dictionary& configuration) {
     const MutexLock lock(configurationMutex_);
-    configuration_ = configuration_.merging(configuration);
+    Dictionary merged = configuration_.merging(configuration);
+    if (budget_ != nullptr) {
+        if (const auto limit = configurationShare_.resize(memoryOf(merged))) {
+            const std::string text = textOf(*limit);
+            if (!std::exchange(configurationRefusalTold_, true)) {
+                sessionLog().error("reporter %lli keeps its configuration as it is: %@", reporterID_, text);
+            }
+            return platform::Failure{0, text};
+        }
+    }
+    configuration_ = std::move(merged);
+    return std::nullopt;
 }
 
 Value VelaReportingSession::applicationName() const { return VelaReportingUtilityRetrieveAppName(configuration()); }

@@ -139,9 +139,9 @@ public:
 
     /// Empty until something is merged into it.
     Dictionary configuration() const;
-    /// Merges; none is ignored.
-    void setConfiguration(const std::optional<Dictionary>& configuration);
-    void updateConfigurationWithContentsOfConfiguration(const Dictionary& configuration);
+    /// Merges; none is ignored. Answers why not, when the session may not keep so much, or none.
+    std::optional<platform::Failure> setConfiguration(const std::optional<Dictionary>& configuration);
+    std::optional<platform::Failure> updateConfigurationWithContentsOfConfiguration(const Dictionary& configuration);
 
     /// Drivers' statistics at the start; none while nobody took them. For the thread that starts and stops the session.
     const std::optional<VelaReportingDriverSnapShot>& driverSnapShot() const { return driverSnapShot_; }
@@ -217,6 +217,7 @@ private:
     void sendBeaconReportingMessage(BeaconMessage message);
     std::optional<platform::Failure> shapeAndSend(const Dictionary& message, std::uint32_t category, std::uint16_t type,
                                                   Limits limits);
+    std::string textOf(VelaReportingMemoryLimit limit) const;
     platform::Failure refuse(VelaReportingMemoryLimit limit);
     void endBeaconReporting();
     void endList();
@@ -250,6 +251,8 @@ private:
     VelaReportingStartTransaction transaction_;
     mutable Mutex configurationMutex_;
     Dictionary configuration_ VELA_GUARDED_BY(configurationMutex_);
+    VelaReportingSessionShare configurationShare_ VELA_GUARDED_BY(configurationMutex_){budget_, 0};
+    bool configurationRefusalTold_ VELA_GUARDED_BY(configurationMutex_) = false;
     std::once_flag beaconReportingQueueMade_;
 
     // Confined to the session's queue.

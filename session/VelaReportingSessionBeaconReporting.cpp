@@ -63,10 +63,12 @@ void sendSingleMessageNow(const VelaReportingSessionPlatform& sessionPlatform, c
 
 // What Beacon took is counted by Beacon.
 void endDelivery(LedgerItem& item, const std::optional<platform::Failure>& error) {
-    if (error) {
-        item.drop(error->code == ENOBUFS ? DropReason::QueueFull : DropReason::Failed);
-    } else {
+    if (!error) {
         item.handOver();
+    } else if (error->code == ENOBUFS) {
+        item.drop(DropReason::QueueFull);
+    } else {
+        item.drop(error->code == EMSGSIZE ? DropReason::Limit : DropReason::Failed);
     }
 }
 

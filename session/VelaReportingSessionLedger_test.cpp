@@ -51,6 +51,15 @@ TEST_F(VelaReportingSessionLedgerTest, AMessageThatMeetsAFullQueueOfBeaconIsCoun
     EXPECT_EQ(dropped(DropReason::Failed), 0U);
 }
 
+TEST_F(VelaReportingSessionLedgerTest, AMessageThatIsTooLargeForBeaconIsCountedAsThat) {
+    runningSession();
+    beacon_.failSends("larger than the queue", EMSGSIZE);
+    send({{"a", 1}});
+    queues_.runUntilIdle();
+    EXPECT_EQ(dropped(DropReason::Limit), 1U);
+    EXPECT_EQ(dropped(DropReason::Failed), 0U);
+}
+
 TEST_F(VelaReportingSessionLedgerTest, WithoutBackEndsMessagesAreDropped) {
     beacon_.setDiscovery(BeaconDiscovery::FindsNone);
     session().start();

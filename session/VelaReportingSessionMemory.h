@@ -1,5 +1,5 @@
-// Bounds what sessions keep in memory: each one's messages, and those of all together. What does not fit is refused and
-// counted.
+// Bounds what sessions keep in memory: each one's messages and configuration, and those of all together. What does not
+// fit is refused and counted.
 //
 // Everything here is thread-safe. `VelaReportingSessionMemory` is one for the service and outlives every session; a
 // budget is one session's part, a share what one message takes of it, given back when the share is destroyed.
@@ -87,6 +87,16 @@ public:
         }
     }
 
+    /// Makes it `bytes`, or leaves it as it is and says which limit that would pass.
+    std::optional<VelaReportingMemoryLimit> resize(std::uint64_t bytes) {
+        if (bytes <= bytes_) {
+            budget_->give(bytes_ - bytes);
+        } else if (const auto limit = budget_->take(bytes - bytes_)) {
+            return limit;
+        }
+        bytes_ = bytes;
+        return std::nullopt;
+    }
     /// Its bytes, which are from now on the caller's to give back.
     std::uint64_t keep() { return std::exchange(bytes_, 0); }
 

@@ -10,8 +10,9 @@ using ::testing::IsEmpty;
 using ::testing::SizeIs;
 
 /// A tagged message of one text of 64 bytes takes 16 + 2 * 9 (padded) of its own, 8 + 64 for the text and 8 + 16 for
-/// the tag "GenericStart".
-constexpr std::uint64_t kMessageBytes = 16 + 2 * 8 + 8 + 8 + 64 + 8 + 16;
+/// the tag "GenericStart"; and, as long as few others have them, 32 + 2 * 8 for the list of its keys and 24 + 16 for
+/// each key.
+constexpr std::uint64_t kMessageBytes = 16 + 2 * 8 + 8 + 8 + 64 + 8 + 16 + 32 + 2 * 8 + 2 * (24 + 16);
 
 class VelaReportingSessionMemoryTest : public SessionTest {
 protected:
@@ -61,7 +62,7 @@ TEST_F(VelaReportingSessionMemoryTest, WhatPassesTheSessionsLimitIsRefusedAndCou
     queues_.runUntilIdle();
     EXPECT_EQ(sendTo(session(), message('b')), "");
     queues_.runUntilIdle();
-    EXPECT_EQ(sendTo(session(), message('c')), "limits.session_bytes is 408 B");
+    EXPECT_EQ(sendTo(session(), message('c')), "limits.session_bytes is 792 B");
     queues_.runUntilIdle();
     EXPECT_EQ(memory_->refusals(), 1U);
     EXPECT_THAT(recordedKeys(), ElementsAre("Generic_Start_1", "Generic_Start_2"));
@@ -74,7 +75,7 @@ TEST_F(VelaReportingSessionMemoryTest, WhatPassesTheLimitOfAllIsRefused) {
     other->start();
     EXPECT_EQ(sendTo(*other, message('a')), "");
     runningSession();
-    EXPECT_EQ(sendTo(session(), message('a')), "limits.total_bytes is 272 B");
+    EXPECT_EQ(sendTo(session(), message('a')), "limits.total_bytes is 528 B");
     EXPECT_EQ(memory_->refusals(), 1U);
     other->stop();
     EXPECT_EQ(sendTo(session(), message('a')), "");
@@ -114,6 +115,47 @@ TEST_F(VelaReportingSessionMemoryTest, ASessionThatIsReleasedWithoutStopGivesIts
     queues_.runUntilIdle();
     release();
     EXPECT_EQ(memory_->bytes(), 0U);
+}
+
+TEST_F(VelaReportingSessionMemoryTest, InventedKeysCount) {
+    limit(100'000, 100'000);
+    runningSession();
+    const std::string longKey(40'000, 'k');
+    EXPECT_EQ(sendTo(session(), {{longKey + '1', 1}}), "");
+    EXPECT_EQ(sendTo(session(), {{longKey + '2', 1}}), "limits.session_bytes is 100000 B");
+    release();
+}
+
+TEST_F(VelaReportingSessionMemoryTest, TheConfigurationCountsAsLongAsTheSessionLives) {
+    limit(10'000, 10'000);
+    session();
+    const std::string text(8'000, 'x');
+    EXPECT_EQ(session().setConfiguration(Dictionary{{"text", std::string_view(text)}}), std::nullopt);
+    // 24 + 8 of its own, 8 for the text, 32 + 8 for the list of its keys and 24 + 16 for its key.
+    EXPECT_EQ(memory_->bytes(), 8'000U + 24 + 8 + 8 + 32 + 8 + 24 + 16);
+    EXPECT_EQ(session().setConfiguration(Dictionary{{"text", 1}}), std::nullopt);
+    EXPECT_EQ(memory_->bytes(), 24U + 8 + 32 + 8 + 24 + 16);
+    release();
+    EXPECT_EQ(memory_->bytes(), 0U);
+}
+
+TEST_F(VelaReportingSessionMemoryTest, AConfigurationThatPassesALimitLeavesItAsItIsAndIsLoggedOnce) {
+    limit(10'000, 10'000);
+    session();
+    session().setConfiguration(Dictionary{{"text", "old"}});
+    const std::uint64_t before = memory_->bytes();
+    log_.clear();
+    const std::string text(10'000, 'x');
+    for (int count = 0; count < 2; ++count) {
+        const auto refusal = session().setConfiguration(Dictionary{{"text", std::string_view(text)}, {"more", 1}});
+        ASSERT_TRUE(refusal);
+        EXPECT_EQ(refusal->description, "limits.session_bytes is 10000 B");
+    }
+    EXPECT_EQ(session().configuration(), (Dictionary{{"text", "old"}}));
+    EXPECT_EQ(memory_->bytes(), before);
+    EXPECT_THAT(log_.lines(),
+                ElementsAre(sessionLine(
+                    LogLevel::Error, "reporter 42 keeps its configuration as it is: limits.session_bytes is 10000 B")));
 }
 
 TEST_F(VelaReportingSessionMemoryTest, AMessageOfASessionNotStartedCountsUntilItIsSent) {

@@ -60,12 +60,13 @@ void VelaReportingSessionTracing::start(const Subject& subject) {
 
 void VelaReportingSessionTracing::startKernelTrace(ValueRef path, std::string_view serviceName) {
     sessionLog().debug("Got the tracefile %@, setting up trace", path);
-    // What is no text names no file.
-    setupTracing(path.isString() ? std::optional<std::string>(path.text()) : std::nullopt, serviceName);
-    if (tracingFileName_) {
-        setStartedTracing(true);
-        traceRunner_->runTraces();
+    if (!path.isString()) {
+        setupTracing(std::nullopt, serviceName); // it names no file, and an earlier run's is not this one's
+        return;
     }
+    setupTracing(std::string(path.text()), serviceName);
+    setStartedTracing(true);
+    traceRunner_->runTraces();
 }
 
 void VelaReportingSessionTracing::setupTracing(const std::optional<std::string>& path, std::string_view serviceName) {
@@ -108,6 +109,7 @@ void VelaReportingSessionTracing::stop(const Subject& subject) {
     setStartedTracing(false);
     if (isKernelTrace(subject.configuration) && tracingFileName_) {
         traceRunner_->stopTracingandProcessResults();
+        traceRunner_->forgetResults(); // a stopped session may stay for long
     } else {
         endPlatformTrace();
     }

@@ -207,6 +207,22 @@ TEST_F(VelaReportingSessionTracingTest, APathThatIsNoTextStartsNothing) {
                             sessionLine(LogLevel::Error, "TracefileName empty. Failed to setup tracing")));
 }
 
+TEST_F(VelaReportingSessionTracingTest, APathThatIsNoTextDoesNotRunAnEarlierTraceAgain) {
+    kernelSession().start();
+    spoor_.emit(0x21040010);
+    spoor_.emit(0x21040014);
+    session().stop();
+    ASSERT_EQ(metricsheet_.files().size(), 1U);
+    spoor_.clear();
+    testSession({{kPathKey, 5}}).start();
+    EXPECT_FALSE(tracing().startedTracing());
+    EXPECT_FALSE(kernelTraceRan());
+    session().stop();
+    EXPECT_EQ(spoor_.calls().size(), 0U);
+    EXPECT_EQ(metricsheet_.files().size(), 1U);
+    EXPECT_FALSE(probeWasUsed());
+}
+
 TEST_F(VelaReportingSessionTracingTest, SettingUpWithoutAPathChangesNothing) {
     kernelSession().start();
     const TraceRunner* const runner = tracing().traceRunner();

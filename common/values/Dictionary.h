@@ -192,6 +192,7 @@ private:
     friend class DictionaryBuilder;
     friend class Value;
     friend class ValueRef;
+    friend std::size_t memoryOf(const Dictionary& dictionary);
     explicit Dictionary(detail::DictionaryObject* retained) : object_(retained) {}
 
     ValueRef at(std::uint32_t slot) const {
@@ -205,6 +206,11 @@ private:
 };
 
 bool equalExcept(const Dictionary& left, const Dictionary& right, std::span<const Key> ignored);
+
+/// As of a value that holds it.
+inline std::size_t memoryOf(const Dictionary& dictionary) {
+    return detail::memoryOf(ValueKind::Dictionary, detail::payloadOf(dictionary.object_));
+}
 
 /// Collects entries and makes a dictionary of them. The keys that followed last time on this thread after the same
 /// first key are expected again: while that holds, a key given as text costs one comparison and no look-up.

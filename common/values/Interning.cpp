@@ -7,6 +7,7 @@
 #include <bit>
 #include <memory>
 #include <mutex>
+#include <numeric>
 #include <random>
 #include <string>
 
@@ -58,8 +59,19 @@ std::uint64_t hashKeys(std::span<const Key> keys) {
     return hash;
 }
 
+std::size_t textBytes(std::size_t size) { return (size + KeyObject::kQuotes + 15U) / 16U * 16U; }
+
+std::uint64_t bytesOf(const KeyObject& key) { return sizeof(KeyObject) + textBytes(key.size); }
+
+/// Without its keys.
+std::size_t ownBytes(std::size_t keys, std::uint64_t indexSize) {
+    return sizeof(ShapeObject) + keys * sizeof(Key) + indexSize * sizeof(std::uint32_t);
+}
+
+std::uint64_t bytesOf(const ShapeObject& shape) { return shape.bytes; }
+
 // Objects found by hash. It holds one reference to each; those that it alone holds are dropped when it has doubled
-// since the last sweep. Guarded by the mutex of `Interned`.
+// since the last sweep, in number or in bytes. Guarded by the mutex of `Interned`.
 template <class ObjectType>
 class Table {
 public:
@@ -79,20 +91,20 @@ public:
     /// Takes over one reference. `drop` destroys what a sweep removes.
     template <class Drop>
     void insert(ObjectType* object, const Drop& drop) {
-        if (count_ >= sweepAt_) {
+        if (count_ >= sweepAt_ || bytes_ >= sweepAtBytes_) {
             sweep(drop);
         }
         if ((count_ + 1) * 2 > slots_.size()) {
             rehash(std::max<std::size_t>(1024, slots_.size() * 2));
         }
-        place(object);
-        ++count_;
+        take(object);
     }
 
     std::size_t size() const { return count_; }
 
 private:
     static constexpr std::size_t kFirstSweep = 4096;
+    static constexpr std::uint64_t kFirstSweepBytes = 4 * 1024 * 1024;
 
     std::size_t mask() const { return slots_.size() - 1; }
 
@@ -102,6 +114,12 @@ private:
             place = (place + 1) & mask();
         }
         slots_[place] = object;
+    }
+
+    void take(ObjectType* object) {
+        place(object);
+        ++count_;
+        bytes_ += bytesOf(*object);
     }
 
     void rehash(std::size_t size) {
@@ -119,6 +137,7 @@ private:
         std::vector<ObjectType*> old(slots_.size(), nullptr);
         old.swap(slots_);
         count_ = 0;
+        bytes_ = 0;
         for (ObjectType* object : old) {
             if (object == nullptr) {
                 continue;
@@ -127,16 +146,18 @@ private:
             if (object->references.load(std::memory_order_acquire) == 1) {
                 drop(object);
             } else {
-                place(object);
-                ++count_;
+                take(object);
             }
         }
         sweepAt_ = std::max(kFirstSweep, count_ * 2);
+        sweepAtBytes_ = std::max(kFirstSweepBytes, bytes_ * 2);
     }
 
     std::vector<ObjectType*> slots_;
     std::size_t count_ = 0;
     std::size_t sweepAt_ = kFirstSweep;
+    std::uint64_t bytes_ = 0;
+    std::uint64_t sweepAtBytes_ = kFirstSweepBytes;
 };
 
 struct Interned {
@@ -169,13 +190,13 @@ bool isPlain(std::string_view text) {
 }
 
 KeyObject* newKey(std::string_view text, std::uint64_t hash) {
-    const std::size_t textBytes = (text.size() + KeyObject::kQuotes + 15U) / 16U * 16U;
-    auto* key = ::new (::operator new(sizeof(KeyObject) + textBytes)) KeyObject;
+    const std::size_t padded = textBytes(text.size());
+    auto* key = ::new (::operator new(sizeof(KeyObject) + padded)) KeyObject;
     key->size = static_cast<std::uint32_t>(text.size());
     key->hash = hash;
     key->plain = isPlain(text);
     char* bytes = key->quoted();
-    std::fill_n(bytes, textBytes, '\0');
+    std::fill_n(bytes, padded, '\0');
     bytes[0] = '"';
     std::copy(text.begin(), text.end(), bytes + 1);
     bytes[text.size() + 1] = '"';
@@ -206,11 +227,13 @@ void fillIndex(ShapeObject& shape) {
 
 ShapeObject* newShape(std::span<const Key> keys, std::uint64_t hash) {
     const std::uint64_t indexSize = keys.size() > ShapeObject::kLinear ? std::bit_ceil(keys.size() * 2) : 0;
-    const std::size_t bytes = sizeof(ShapeObject) + keys.size() * sizeof(Key) + indexSize * sizeof(std::uint32_t);
-    auto* shape = ::new (::operator new(bytes)) ShapeObject;
+    const std::size_t own = ownBytes(keys.size(), indexSize);
+    auto* shape = ::new (::operator new(own)) ShapeObject;
     shape->size = static_cast<std::uint32_t>(keys.size());
     shape->hash = hash;
     shape->indexSize = indexSize;
+    shape->bytes = std::accumulate(keys.begin(), keys.end(), std::uint64_t{own},
+                                   [](std::uint64_t sum, const Key& key) { return sum + bytesOf(*key.object()); });
     std::uninitialized_copy(keys.begin(), keys.end(), shape->keys());
     fillIndex(*shape);
     return shape;
@@ -222,7 +245,7 @@ ObjectType* retained(ObjectType* object) {
     return object;
 }
 
-// What one thread saw last. Every entry holds references, so that what it names lives.
+// What one thread saw last. Every entry holds references, so that what it names lives; what is large is not kept so.
 class ThreadCache {
 public:
     ThreadCache() = default;
@@ -248,6 +271,9 @@ public:
         return key != nullptr && key->hash == hash && key->view() == text ? retained(key) : nullptr;
     }
     void rememberKey(KeyObject* key) {
+        if (key->size > kLargestKey) {
+            return;
+        }
         KeyObject*& place = keys_[key->hash % keys_.size()];
         releaseKey(std::exchange(place, retained(key)));
     }
@@ -260,13 +286,20 @@ public:
         }
         return retained(shape);
     }
-    void rememberShape(const ShapeObject* shape) { replace(shapes_[shape->hash % shapes_.size()], shape); }
+    void rememberShape(const ShapeObject* shape) {
+        if (shape->bytes <= kLargestShape) {
+            replace(shapes_[shape->hash % shapes_.size()], shape);
+        }
+    }
 
     const ShapeObject* expected(const KeyObject* firstKey) const {
         const ShapeObject* shape = expected_[firstKey->hash % expected_.size()];
         return shape != nullptr && shape->keys()[0].object() == firstKey ? retained(shape) : nullptr;
     }
     void expect(const ShapeObject* shape) {
+        if (shape->bytes > kLargestShape) {
+            return;
+        }
         replace(expected_[shape->keys()[0].object()->hash % expected_.size()], shape);
     }
 
@@ -280,6 +313,9 @@ public:
     }
     void rememberStep(StepKind kind, const ShapeObject* from, std::uint64_t detail, const KeyObject* key,
                       const ShapeObject* to) {
+        if (to->bytes > kLargestShape || (from != nullptr && from->bytes > kLargestShape)) {
+            return;
+        }
         Step& step = steps_[place(kind, from, detail)];
         const Step old = std::exchange(step, Step{kind, retained(from), detail, retained(key), retained(to)});
         forget(old);
@@ -317,6 +353,8 @@ private:
         releaseKey(step.key);
     }
 
+    static constexpr std::uint32_t kLargestKey = 1024;
+    static constexpr std::uint64_t kLargestShape = 16 * 1024;
     static constexpr std::size_t kSteps = 128;
     std::array<KeyObject*, 256> keys_{};
     std::array<const ShapeObject*, 64> shapes_{};

@@ -1,9 +1,11 @@
 #include "common/values/Dictionary.h"
 #include "common/values/Key.h"
 
+#include <fstream>
 #include <gtest/gtest.h>
 #include <string>
 #include <thread>
+#include <unistd.h>
 #include <vector>
 
 namespace vela {
@@ -40,6 +42,38 @@ TEST(InterningTest, KeysThatNobodyUsesDoNotPileUp) {
     // The tables are swept when they have doubled; what the caches of this thread hold comes on top.
     EXPECT_LT(internedCounts().keys, 10000U);
     EXPECT_LT(internedCounts().shapes, 10000U);
+}
+
+std::size_t residentBytes() {
+    std::ifstream file("/proc/self/statm");
+    std::size_t pages = 0;
+    file >> pages >> pages;
+    return pages * static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
+}
+
+TEST(InterningTest, LargeKeysThatNobodyUsesDoNotPileUp) {
+    constexpr std::size_t kKeyBytes = 1024 * 1024;
+    const std::size_t before = residentBytes();
+    std::string key(kKeyBytes, 'k');
+    for (int index = 0; index < 1000; ++index) {
+        key.replace(0, 8, std::to_string(10'000'000 + index));
+        const Dictionary dictionary = {{key, index}};
+        EXPECT_EQ(dictionary.setting(Key("other"), 1).removing(Key("other")), dictionary);
+    }
+    EXPECT_LT(residentBytes(), before + 100 * kKeyBytes);
+}
+
+TEST(InterningTest, ManyKeysOfOneDictionaryThatNobodyUsesDoNotPileUp) {
+    const std::size_t before = residentBytes();
+    for (int index = 0; index < 300; ++index) {
+        DictionaryBuilder builder;
+        for (int key = 0; key < 5'000; ++key) {
+            builder.add("invented " + std::to_string(index) + " and " + std::to_string(key), key);
+        }
+        EXPECT_EQ(builder.build().size(), 5'000U);
+    }
+    // All of them would take 150 MB.
+    EXPECT_LT(residentBytes(), before + 50U * 1024 * 1024);
 }
 
 TEST(InterningTest, KeysInUseSurviveTheSweeps) {

@@ -57,7 +57,10 @@ public:
             return false;
         }
         // The usual lengths without a call; a shorter text may not be read a word at a time.
-        return text.size() > 8 ? detail::sameBytes(text.data(), right.data(), left.object_->size) : text == right;
+        if (text.size() > 8) {
+            return detail::sameBytes(text.data(), right.data(), left.object_->size);
+        }
+        return text.size() >= 4 ? detail::sameHalfWords(text.data(), right.data(), text.size()) : text == right;
     }
 
     const detail::KeyObject* object() const { return object_; }

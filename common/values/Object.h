@@ -51,12 +51,15 @@ struct BytesObject : Object {
     std::string_view view() const { return {bytes(), size}; }
 };
 
+/// Bytes that a text of `size` takes, padding included.
+constexpr std::size_t paddedBytes(std::size_t size) { return (size + 7) / 8 * 8; }
+
 /// Copies `text` into a new object; null for none.
 inline BytesObject* makeBytes(std::string_view text) {
     if (text.empty()) {
         return nullptr;
     }
-    const std::size_t padded = (text.size() + 7) / 8 * 8;
+    const std::size_t padded = paddedBytes(text.size());
     auto* object = ::new (::operator new(sizeof(BytesObject) + padded)) BytesObject;
     object->size = static_cast<std::uint32_t>(text.size());
     constexpr std::uint64_t kNone = 0;
@@ -85,6 +88,17 @@ inline bool sameBytes(const char* left, const char* right, std::uint32_t size) {
                 (wordAt(left + size - 16) ^ wordAt(right + size - 16))) == 0;
     }
     return std::memcmp(left, right, size) == 0;
+}
+
+inline std::uint32_t halfWordAt(const char* bytes) {
+    std::uint32_t halfWord = 0;
+    std::memcpy(&halfWord, bytes, sizeof(halfWord));
+    return halfWord;
+}
+
+/// Whether 4 to 8 bytes are the same, whatever follows them.
+inline bool sameHalfWords(const char* left, const char* right, std::size_t size) {
+    return ((halfWordAt(left) ^ halfWordAt(right)) | (halfWordAt(left + size - 4) ^ halfWordAt(right + size - 4))) == 0;
 }
 
 /// Whether two objects (null for none) hold the same bytes.

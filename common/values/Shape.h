@@ -17,13 +17,14 @@ namespace vela::detail {
 
 constexpr std::uint32_t kNoSlot = 0xFFFFFFFF;
 
-/// | Object | hash | index size | keys | index: slot + 1 by key hash, only for more than kLinear keys |
+/// | Object | hash | index size | bytes | keys | index: slot + 1 by key hash, only for more than kLinear keys |
 struct ShapeObject : Object {
     /// Up to here a look-up compares pointers one after another.
     static constexpr std::uint32_t kLinear = 16;
 
     std::uint64_t hash = 0;
     std::uint64_t indexSize = 0; ///< a power of two, or 0
+    std::uint64_t bytes = 0;     ///< of the shape and its keys
 
     const Key* keys() const { return reinterpret_cast<const Key*>(this + 1); }
     Key* keys() { return reinterpret_cast<Key*>(this + 1); }

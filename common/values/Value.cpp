@@ -15,8 +15,9 @@ template <class Container>
 void destroyContainer(Container* object) {
     forEachReference(object->kinds(), object->size,
                      [object](std::uint32_t slot) { releaseValue(object->kinds()[slot], object->payloads()[slot]); });
+    const std::size_t bytes = sizeof(Container) + blockBytes(object->size);
     object->~Container();
-    ::operator delete(object);
+    ::operator delete(object, bytes);
 }
 
 bool isReal(ValueKind kind) { return kind == ValueKind::Real || kind == ValueKind::Real32; }
@@ -120,8 +121,9 @@ void destroy(ValueKind kind, std::uint64_t payload) {
     }
     default: {
         auto* object = objectOf<BytesObject>(payload);
+        const std::size_t bytes = sizeof(BytesObject) + paddedBytes(object->size);
         object->~BytesObject();
-        ::operator delete(object);
+        ::operator delete(object, bytes);
         return;
     }
     }
@@ -156,14 +158,23 @@ bool equal(ValueKind leftKind, std::uint64_t left, ValueKind rightKind, std::uin
 
 namespace {
 
+/// Those of keys that hardly any other dictionary has; the caches of a few threads may refer to them as well.
+std::size_t bytesOfOwnKeys(const detail::ShapeObject* shape) {
+    constexpr std::uint32_t kFew = 16;
+    return shape->references.load(std::memory_order_relaxed) <= kFew ? shape->bytes : 0;
+}
+
 template <class Container>
 std::size_t memoryOfContainer(const Container* object) {
     if (object == nullptr) {
         return 0;
     }
     std::size_t bytes = sizeof(Container) + detail::blockBytes(object->size);
-    for (std::uint32_t slot = 0; slot < object->size; ++slot) {
+    detail::forEachReference(object->kinds(), object->size, [object, &bytes](std::uint32_t slot) {
         bytes += detail::memoryOf(object->kinds()[slot], object->payloads()[slot]);
+    });
+    if constexpr (std::is_same_v<Container, detail::DictionaryObject>) {
+        bytes += bytesOfOwnKeys(object->shape);
     }
     return bytes;
 }
@@ -175,7 +186,7 @@ std::size_t detail::memoryOf(ValueKind kind, std::uint64_t payload) {
     case ValueKind::String:
     case ValueKind::Data: {
         const auto* object = objectOf<const BytesObject>(payload);
-        return object == nullptr ? 0 : sizeof(BytesObject) + (object->size + std::size_t{7}) / 8 * 8;
+        return object == nullptr ? 0 : sizeof(BytesObject) + paddedBytes(object->size);
     }
     case ValueKind::Array:
         return memoryOfContainer(objectOf<const ArrayObject>(payload));

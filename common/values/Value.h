@@ -166,7 +166,8 @@ private:
 };
 
 /// Bytes of memory that `value` holds: its objects with everything inside them, also what it shares with other values,
-/// without keys and the allocator's own.
+/// without the allocator's own. Keys count where hardly any other dictionary has the same ones in the same order, so
+/// the answer may be another one the next time.
 inline std::size_t memoryOf(ValueRef value) { return detail::memoryOf(value.kind_, value.payload_); }
 
 /// Whether two numbers (booleans among them) are equal as numbers, exactly; what is no number equals nothing.

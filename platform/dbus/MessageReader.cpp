@@ -97,13 +97,13 @@ void BodyReader::entry(DictionaryBuilder& builder) {
 
 Value BodyReader::variant() {
     const std::string_view type = wire_.variantSignature();
+    if (type.size() == 1 && type.front() != 'h' && type.front() != 'v') [[likely]] {
+        return valueOf(type.front());
+    }
     if (wire_.failed()) {
         return {};
     }
-    if (!isSupported(type)) {
-        return unsupported(type);
-    }
-    return value(type);
+    return isSupported(type) ? value(type) : unsupported(type);
 }
 
 Value BodyReader::unsupported(std::string_view type) {

@@ -96,27 +96,42 @@ private:
     int structures_ = 0;
 };
 
+template <class Number>
+Number numberAt(const char* bytes) {
+    Number number = 0;
+    std::memcpy(&number, bytes, sizeof(number));
+    return number;
+}
+
+/// Whether all eight bytes are ASCII other than NUL.
+bool isPlain(std::uint64_t eight) {
+    constexpr std::uint64_t kOnes = 0x0101010101010101U;
+    constexpr std::uint64_t kHighBits = 0x8080808080808080U;
+    // A zero byte borrows, so its high bit shows up as well as that of a byte beyond ASCII.
+    return ((eight | (eight - kOnes)) & kHighBits) == 0;
+}
+
 } // namespace
 
 bool isValidText(std::string_view text) {
-    constexpr std::uint64_t kOnes = 0x0101010101010101U;
-    constexpr std::uint64_t kHighBits = 0x8080808080808080U;
-    std::size_t index = 0;
-    for (; index + sizeof(std::uint64_t) <= text.size(); index += sizeof(std::uint64_t)) {
-        std::uint64_t eight = 0;
-        std::memcpy(&eight, text.data() + index, sizeof(eight));
-        // A zero byte borrows, so its high bit shows up as well as that of a byte beyond ASCII.
-        if (((eight | (eight - kOnes)) & kHighBits) != 0) {
-            break;
+    const char* const bytes = text.data();
+    const std::size_t size = text.size();
+    bool plain = true;
+    if (size >= sizeof(std::uint64_t)) {
+        const std::size_t last = size - sizeof(std::uint64_t);
+        for (std::size_t index = 0; index < last && plain; index += sizeof(std::uint64_t)) {
+            plain = isPlain(numberAt<std::uint64_t>(bytes + index));
+        }
+        plain = plain && isPlain(numberAt<std::uint64_t>(bytes + last));
+    } else if (size >= sizeof(std::uint32_t)) {
+        const std::uint64_t first = numberAt<std::uint32_t>(bytes);
+        plain = isPlain(first << 32U | numberAt<std::uint32_t>(bytes + size - sizeof(std::uint32_t)));
+    } else {
+        for (const char byte : text) {
+            plain = plain && static_cast<signed char>(byte) > 0;
         }
     }
-    for (; index < text.size(); ++index) {
-        if (static_cast<signed char>(text[index]) <= 0) {
-            const std::string_view rest = text.substr(index);
-            return std::memchr(rest.data(), 0, rest.size()) == nullptr && isValidUtf8(rest);
-        }
-    }
-    return true;
+    return plain || (text.find('\0') == std::string_view::npos && isValidUtf8(text));
 }
 
 bool isValidObjectPath(std::string_view path) {

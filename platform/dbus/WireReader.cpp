@@ -74,14 +74,7 @@ std::string_view WireReader::signature() {
     return signature;
 }
 
-std::string_view WireReader::variantSignature() {
-    // Nearly all are one basic type: its length, its code, NUL.
-    if (remaining() >= 3 && bytes_[position_] == 1 && bytes_[position_ + 2] == '\0' &&
-        isBasicType(bytes_[position_ + 1])) [[likely]] {
-        const std::string_view type = bytes_.substr(position_ + 1, 1);
-        position_ += 3;
-        return type;
-    }
+std::string_view WireReader::otherVariantSignature() {
     const std::string_view type = signature();
     if (type.empty() || (type.size() > 1 && completeTypeBytes(type) != type.size())) [[unlikely]] {
         if (!failed()) {

@@ -57,7 +57,16 @@ public:
     std::string_view objectPath();
     std::string_view signature();
     /// A variant's signature: exactly one complete type.
-    std::string_view variantSignature();
+    std::string_view variantSignature() {
+        // Nearly all are one basic type: its length, its code, NUL.
+        if (remaining() >= 3 && bytes_[position_] == 1 && bytes_[position_ + 2] == '\0' &&
+            isBasicType(bytes_[position_ + 1])) [[likely]] {
+            const std::string_view type = bytes_.substr(position_ + 1, 1);
+            position_ += 3;
+            return type;
+        }
+        return otherVariantSignature();
+    }
     /// The bytes of an array's elements, which this passes over.
     std::string_view array(std::size_t elementAlignment);
     /// Begins an array: where its elements end, which the caller reads up to and then hands to `endArray`.
@@ -67,7 +76,15 @@ public:
     /// Skips zeros up to a multiple of `alignment`.
     bool align(std::size_t alignment) {
         const std::size_t to = (position_ + alignment - 1) & ~(alignment - 1);
-        return to == position_ || alignSlowly(to);
+        if (to == position_) {
+            return true;
+        }
+        // Padding has fewer than eight bytes, so that one load shows all of it.
+        if (remaining() >= sizeof(std::uint64_t) && beginsWithZeros(to - position_)) [[likely]] {
+            position_ = to;
+            return true;
+        }
+        return alignSlowly(to);
     }
     /// Passes over one value of a complete type, which is checked as if it were read.
     void skip(std::string_view type, unsigned depth = 0);
@@ -82,8 +99,16 @@ public:
     void failMalformed(const char* text) { fail(kInconsistentMessageError, text); }
 
 private:
+    /// Whether the next `count` bytes, 1 to 7 of the eight that are there, are zeros.
+    bool beginsWithZeros(std::size_t count) const {
+        std::uint64_t eight = 0;
+        std::memcpy(&eight, bytes_.data() + position_, sizeof(eight));
+        const std::size_t otherBits = 8 * (sizeof(eight) - count);
+        return (std::endian::native == std::endian::little ? eight << otherBits : eight >> otherBits) == 0;
+    }
     bool alignSlowly(std::size_t to);
     void failShort();
+    std::string_view otherVariantSignature();
     std::string_view terminated(std::size_t length);
 
     std::string_view bytes_;

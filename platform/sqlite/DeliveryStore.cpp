@@ -98,7 +98,7 @@ StoreRecord DeliveryStore::newDelivery(DeliveryBackend backend, StoreOperation o
     return record;
 }
 
-void DeliveryStore::add(StoreRecord record) {
+void DeliveryStore::add(StoreRecord&& record) {
     const std::optional<DropReason> refused = tryAdd(record);
     if (refused && record.entry != nullptr) {
         record.entry->dropped(record.backend, *refused);

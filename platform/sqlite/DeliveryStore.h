@@ -36,7 +36,7 @@ public:
     /// A record for `add`, of the calling thread's account and its session, counted as received.
     StoreRecord newDelivery(DeliveryBackend backend, StoreOperation operation) const;
     /// Takes the record, stamped with the time; one that is refused is counted as dropped.
-    void add(StoreRecord record);
+    void add(StoreRecord&& record);
     /// Takes the record, or answers why not, for the caller to count.
     std::optional<DropReason> tryAdd(StoreRecord& record);
     /// The ledger counted something that is not stored, so that it is written in time.

@@ -74,7 +74,7 @@ struct StoreRecord {
 
 /// Bytes that a record holds while it waits.
 inline std::size_t weightOf(const StoreRecord& record) {
-    return sizeof(StoreRecord) + record.name.view().size() + record.bytes.size() + memoryOf(Value(record.payload)) +
+    return sizeof(StoreRecord) + record.name.view().size() + record.bytes.size() + memoryOf(record.payload) +
            record.builderBytes;
 }
 

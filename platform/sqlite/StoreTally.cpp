@@ -12,8 +12,11 @@ StoreTally::StoreTally(DeliveryStore& store, std::vector<std::string> used)
       patterns_(std::move(used)) {}
 
 bool StoreTally::tallyIsEventUsed(std::string_view eventName) {
-    if (find(eventName).used) {
-        return true;
+    {
+        const MutexLock lock(mutex_);
+        if (find(eventName).used) {
+            return true;
+        }
     }
     const std::shared_ptr<LedgerEntry>& account = store_.account();
     account->received(DeliveryBackend::Tally);
@@ -25,27 +28,33 @@ bool StoreTally::tallyIsEventUsed(std::string_view eventName) {
 void StoreTally::tallySendEventLazy(std::string_view eventName, UniqueFunction<Dictionary()> payload,
                                     std::size_t payloadBytes) {
     StoreRecord record = store_.newDelivery(DeliveryBackend::Tally, StoreOperation::Send);
-    record.name = find(eventName).text;
+    {
+        const MutexLock lock(mutex_);
+        record.name = find(eventName).text;
+    }
     record.builder = std::move(payload);
     record.builderBytes = payloadBytes;
     store_.add(std::move(record));
 }
 
-StoreTally::Name StoreTally::find(std::string_view eventName) {
-    const MutexLock lock(mutex_);
-    if (last_ != nullptr && last_->first == eventName) {
-        return last_->second;
+const StoreTally::Name& StoreTally::find(std::string_view eventName) {
+    for (const auto* const recent : recent_) {
+        if (recent != nullptr && recent->first == eventName) {
+            return recent->second;
+        }
     }
     auto found = names_.find(eventName);
     if (found == names_.end()) {
         if (names_.size() >= kMostNames) {
             names_.clear();
+            recent_.fill(nullptr);
         }
         std::string text(eventName);
         Name name{String(eventName), matches(text)};
         found = names_.emplace(std::move(text), std::move(name)).first;
     }
-    last_ = &*found;
+    recent_[nextRecent_] = &*found;
+    nextRecent_ = (nextRecent_ + 1) % recent_.size();
     return found->second;
 }
 

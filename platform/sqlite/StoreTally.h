@@ -6,6 +6,7 @@
 #include "platform/Tally.h"
 #include "platform/sqlite/DeliveryStore.h"
 
+#include <array>
 #include <cstddef>
 #include <functional>
 #include <string>
@@ -40,15 +41,16 @@ private:
         std::size_t operator()(std::string_view text) const { return std::hash<std::string_view>()(text); }
     };
 
-    Name find(std::string_view eventName);
+    const Name& find(std::string_view eventName) VELA_REQUIRES(mutex_);
     bool matches(const std::string& eventName) const;
 
     DeliveryStore& store_;
     const std::vector<std::string> patterns_;
     Mutex mutex_;
     std::unordered_map<std::string, Name, TextHash, std::equal_to<>> names_ VELA_GUARDED_BY(mutex_);
-    /// The one asked for last, which is asked for twice; null for none.
-    const std::pair<const std::string, Name>* last_ VELA_GUARDED_BY(mutex_) = nullptr;
+    /// Those looked up last, null for none: a message has two names, which the next one often has as well.
+    std::array<const std::pair<const std::string, Name>*, 2> recent_ VELA_GUARDED_BY(mutex_){};
+    std::size_t nextRecent_ VELA_GUARDED_BY(mutex_) = 0;
 };
 
 } // namespace vela::platform
