@@ -3,6 +3,7 @@
 #include "cli/Subcommand.h"
 #include "cli/TextTable.h"
 #include "common/CommandOptions.h"
+#include "common/DeliveryLedger.h"
 #include "common/SettingValues.h"
 #include "common/values/Dictionary.h"
 #include "common/values/Json.h"
@@ -105,7 +106,7 @@ void printEntries(const Dictionary& ledger, Console& console) {
     const Array list = entries.array();
     for (const ValueRef entry : list) {
         const Dictionary accounts = entry.dictionary();
-        const bool earlier = accounts.find("client").integerValue() == 0;
+        const bool earlier = accounts.find("client").integerValue() == kEarlierClient;
         addAccounts(table,
                     {earlier ? "earlier" : count(accounts, "client"), earlier ? "-" : count(accounts, "session")},
                     accounts);

@@ -98,7 +98,7 @@ void LedgerEntry::add(DeliveryBackend backend, const LedgerCounts& counts) {
 
 DeliveryLedger::DeliveryLedger(std::int32_t servicePid)
     : own_(std::make_shared<LedgerEntry>(servicePid, 0)),
-      earlier_(std::make_shared<LedgerEntry>(0, 0)) {}
+      earlier_(std::make_shared<LedgerEntry>(kEarlierClient, 0)) {}
 
 std::shared_ptr<LedgerEntry> DeliveryLedger::open(std::int32_t clientPid, std::int64_t reporterID) {
     // What an earlier service of the same pid left.
@@ -106,41 +106,58 @@ std::shared_ptr<LedgerEntry> DeliveryLedger::open(std::int32_t clientPid, std::i
         return own_;
     }
     const MutexLock lock(mutex_);
-    const auto found = std::find_if(entries_.rbegin(), entries_.rend(), [&](const auto& entry) {
-        return entry->client == clientPid && entry->reporterID == reporterID;
-    });
-    if (found != entries_.rend()) {
-        return *found;
+    const Name name(clientPid, reporterID);
+    if (const auto found = places_.find(name); found != places_.end()) {
+        return entries_[found->second];
     }
-    if (entries_.size() >= kMostEntries) {
+    if (entries_.size() >= foldAt_) {
         foldOldest();
     }
+    places_.emplace(name, entries_.size());
     return entries_.emplace_back(std::make_shared<LedgerEntry>(clientPid, reporterID));
 }
 
-// Makes one entry of those that nobody holds, the oldest half of all at most.
+// Makes one entry of those that nobody holds, the oldest half of all at most. All are looked at, so the next time comes
+// only after a quarter as many more: what an entry costs does not rise with the number of those that are held.
 void DeliveryLedger::foldOldest() {
-    std::vector<std::shared_ptr<LedgerEntry>> kept;
     std::size_t left = entries_.size() / 2;
-    for (std::shared_ptr<LedgerEntry>& entry : entries_) {
-        if (left == 0 || entry.use_count() > 1) {
-            kept.push_back(std::move(entry));
+    std::size_t kept = 0;
+    for (std::size_t place = 0; place < entries_.size(); ++place) {
+        std::shared_ptr<LedgerEntry>& entry = entries_[place];
+        if (left > 0 && fold(entry)) {
+            --left;
             continue;
         }
-        --left;
-        for (std::size_t backend = 0; backend < kDeliveryBackends; ++backend) {
-            earlier_->add(backendNumber(backend), entry->counts(backendNumber(backend)));
+        if (kept != place) {
+            places_[Name(entry->client, entry->reporterID)] = kept;
+            entries_[kept] = std::move(entry);
         }
-        folded_.emplace_back(entry->client, entry->reporterID);
+        ++kept;
     }
-    entries_ = std::move(kept);
+    entries_.resize(kept);
+    foldAt_ = std::max(kMostEntries, kept + kept / 4);
+}
+
+// Answers whether the entry was summed up: whether nobody holds it.
+bool DeliveryLedger::fold(const std::shared_ptr<LedgerEntry>& entry) {
+    if (entry.use_count() > 1) {
+        return false;
+    }
+    for (std::size_t backend = 0; backend < kDeliveryBackends; ++backend) {
+        earlier_->add(backendNumber(backend), entry->counts(backendNumber(backend)));
+    }
+    const Name name(entry->client, entry->reporterID);
+    folded_.push_back(name);
+    places_.erase(name);
+    return true;
 }
 
 void DeliveryLedger::restore(const std::vector<LedgerRow>& rows) {
     for (const LedgerRow& row : rows) {
         LedgerCounts counts = row.counts;
         counts.dropped[static_cast<std::size_t>(DropReason::Restart)] += counts.queued();
-        const bool summed = row.client == 0;
+        // Older files say 0, and a pid of 0 is of many processes.
+        const bool summed = row.client == kEarlierClient || row.client == 0;
         (summed ? earlier_ : open(row.client, row.reporterID))->add(row.backend, counts);
     }
 }

@@ -14,6 +14,7 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string_view>
@@ -24,6 +25,10 @@ namespace vela {
 
 enum class DeliveryBackend : std::uint8_t { Beacon, Tally, Joule, Telem, Malady };
 constexpr std::size_t kDeliveryBackends = 5;
+
+/// In the place of a pid: the account that sums up entries long gone. 0 will not do, which is what the kernel tells of
+/// a client outside the service's name space.
+constexpr std::int32_t kEarlierClient = -1;
 
 enum class DropReason : std::uint8_t {
     NoConsumer,  ///< nobody uses an analytics event of this name
@@ -73,7 +78,7 @@ public:
     /// Whether anything was counted since the last call.
     bool takeChange() { return changed_.exchange(false); }
 
-    const std::int32_t client;     ///< pid; 0 for what is summed up of entries long gone
+    const std::int32_t client;     ///< pid, or kEarlierClient
     const std::int64_t reporterID; ///< 0 for what belongs to no session
 
 private:
@@ -126,18 +131,24 @@ public:
     /// "delivered", "queued", "redundant" and "dropped" by reason. Accounts in which nothing was received are left out.
     Dictionary asDictionary() const;
 
-    /// Entries that are kept one by one; older ones that nobody holds are summed up in one.
+    /// So many entries are kept one by one, or a quarter more than those that are held when these are many; older ones
+    /// that nobody holds are summed up in one.
     static constexpr std::size_t kMostEntries = 1024;
 
 private:
+    using Name = std::pair<std::int32_t, std::int64_t>; ///< client and session
+
     void foldOldest() VELA_REQUIRES(mutex_);
+    bool fold(const std::shared_ptr<LedgerEntry>& entry) VELA_REQUIRES(mutex_);
 
     const std::shared_ptr<LedgerEntry> own_;
     const std::shared_ptr<LedgerEntry> earlier_;
     mutable Mutex mutex_;
     std::vector<std::shared_ptr<LedgerEntry>>
-        entries_ VELA_GUARDED_BY(mutex_); ///< oldest first, the two above not in it
-    std::vector<std::pair<std::int32_t, std::int64_t>> folded_ VELA_GUARDED_BY(mutex_); ///< whose rows are to be erased
+        entries_ VELA_GUARDED_BY(mutex_);                        ///< oldest first, the two above not in it
+    std::map<Name, std::size_t> places_ VELA_GUARDED_BY(mutex_); ///< in entries_
+    std::size_t foldAt_ VELA_GUARDED_BY(mutex_) = kMostEntries;  ///< entries with which some are summed up next
+    std::vector<Name> folded_ VELA_GUARDED_BY(mutex_);           ///< whose rows are to be erased
 };
 
 /// While it lives, what the calling thread hands to back ends belongs to this entry. Scopes nest; the inner one holds.

@@ -125,13 +125,72 @@ TEST_F(DeliveryLedgerTest, OldEntriesThatNobodyHoldsAreSummedUp) {
     }
     ledger_.open(7, 5000);
     const std::vector<LedgerRow> rows = ledger_.takeChanged(true);
-    EXPECT_EQ(rows.front(), (LedgerRow{0, 0, DeliveryBackend::Beacon, {512, 512, 0, {}}}));
+    EXPECT_EQ(rows.front(), (LedgerRow{-1, 0, DeliveryBackend::Beacon, {512, 512, 0, {}}}));
     EXPECT_EQ(rows[1], (LedgerRow{7, 0, DeliveryBackend::Beacon, {1, 0, 0, {}}}));
     // The rows of those that were summed up are to be erased.
     EXPECT_EQ(rows.back().counts, LedgerCounts());
     const auto erased =
         std::count_if(rows.begin(), rows.end(), [](const LedgerRow& row) { return row.counts.received == 0; });
     EXPECT_EQ(erased, 512 * 5);
+}
+
+TEST_F(DeliveryLedgerTest, EntriesThatAreHeldAreAllFoundAgain) {
+    std::vector<std::shared_ptr<LedgerEntry>> held;
+    for (std::int64_t session = 0; session < 20'000; ++session) {
+        held.push_back(ledger_.open(static_cast<std::int32_t>(session % 7 + 1), session));
+        held.back()->received(DeliveryBackend::Beacon);
+    }
+    for (std::int64_t session = 0; session < 20'000; ++session) {
+        ASSERT_EQ(ledger_.open(static_cast<std::int32_t>(session % 7 + 1), session),
+                  held[static_cast<std::size_t>(session)]);
+    }
+    const std::vector<LedgerRow> rows = ledger_.takeChanged();
+    ASSERT_EQ(rows.size(), 20'000U);
+    EXPECT_EQ(rows.front(), (LedgerRow{1, 0, DeliveryBackend::Beacon, {1, 0, 0, {}}}));
+    EXPECT_EQ(rows.back(), (LedgerRow{1, 19'999, DeliveryBackend::Beacon, {1, 0, 0, {}}}));
+}
+
+TEST_F(DeliveryLedgerTest, BesideManyThatAreHeldAQuarterAsManyAreKept) {
+    std::vector<std::shared_ptr<LedgerEntry>> held;
+    for (std::int64_t session = 0; session < 1'025; ++session) {
+        held.push_back(ledger_.open(7, session));
+    }
+    for (std::int64_t session = 0; session < 255; ++session) {
+        ledger_.open(8, session)->received(DeliveryBackend::Beacon);
+    }
+    EXPECT_EQ(ledger_.takeChanged().front(), (LedgerRow{8, 0, DeliveryBackend::Beacon, {1, 0, 0, {}}}));
+    // The 1,281st.
+    const auto last = ledger_.open(9, 0);
+    EXPECT_EQ(ledger_.takeChanged().front(), (LedgerRow{-1, 0, DeliveryBackend::Beacon, {255, 0, 0, {}}}));
+    EXPECT_EQ(ledger_.open(7, 1'024), held.back());
+    EXPECT_EQ(ledger_.open(9, 0), last);
+    EXPECT_EQ(ledger_.open(8, 0)->counts(DeliveryBackend::Beacon), LedgerCounts());
+}
+
+TEST_F(DeliveryLedgerTest, EntriesThatStayAreFoundAfterOthersWereSummedUp) {
+    std::vector<std::shared_ptr<LedgerEntry>> held;
+    for (std::int64_t session = 0; session < 1'024; ++session) {
+        const auto entry = ledger_.open(7, session);
+        if (session % 2 == 1) {
+            held.push_back(entry);
+        }
+    }
+    ledger_.open(7, 5'000);
+    for (std::size_t number = 0; number < held.size(); ++number) {
+        ASSERT_EQ(ledger_.open(7, static_cast<std::int64_t>(2 * number + 1)), held[number]);
+    }
+}
+
+TEST_F(DeliveryLedgerTest, AClientWithoutAPidIsNotTakenForEarlierOnes) {
+    ledger_.restore({{-1, 0, DeliveryBackend::Beacon, {5, 5, 0, {}}}});
+    ledger_.open(0, 0)->received(DeliveryBackend::Beacon);
+    EXPECT_THAT(ledger_.takeChanged(), ElementsAre(LedgerRow{-1, 0, DeliveryBackend::Beacon, {5, 5, 0, {}}},
+                                                   LedgerRow{0, 0, DeliveryBackend::Beacon, {1, 0, 0, {}}}));
+}
+
+TEST_F(DeliveryLedgerTest, WhatAFileSaysOfPidZeroIsTakenUpWithEarlierClients) {
+    ledger_.restore({{0, 0, DeliveryBackend::Beacon, {5, 5, 0, {}}}, {0, 42, DeliveryBackend::Beacon, {2, 2, 0, {}}}});
+    EXPECT_THAT(ledger_.takeChanged(), ElementsAre(LedgerRow{-1, 0, DeliveryBackend::Beacon, {7, 7, 0, {}}}));
 }
 
 TEST_F(DeliveryLedgerTest, TotalsBalanceWhileOthersCount) {

@@ -21,7 +21,7 @@ public:
     /// framework's choosing, with the list, or with none when there is no back end; or never.
     virtual void startBeaconBackendDiscovery(UniqueFunction<void(std::optional<Array> backends)> completion) = 0;
 
-    /// ENOBUFS where the queue to the back ends is full.
+    /// ENOBUFS where the queue to the back ends is full, EMSGSIZE where the message is larger than all of it.
     virtual Result<Done> sendBeaconMessage(std::uint16_t category, std::uint16_t type, const Dictionary& payload) = 0;
 
     /// Sends what the session still holds.

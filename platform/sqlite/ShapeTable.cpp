@@ -59,6 +59,7 @@ bool ShapeTable::rolledBack(std::int64_t lastSeq) {
         Part& part = parts_[backend];
         part.shapes = 0;
         part.bytes = 0;
+        part.collectBehind = 0;
         list_.bind(1, static_cast<std::int64_t>(backend));
         SqliteStatement::Step step = list_.step();
         for (; step == SqliteStatement::Step::Row; step = list_.step()) {
@@ -98,7 +99,7 @@ std::optional<std::int64_t> ShapeTable::intern(const Wanted& wanted, std::int64_
         if (!hasRoom(part(wanted.backend), bytes)) {
             return kNoShape;
         }
-        number = insert(wanted, keys);
+        number = insert(wanted, keys, seq);
     }
     if (number) {
         known_.emplace(Key{wanted.backend, wanted.name, keysOnly(wanted.payload)}, Shape{*number, seq});
@@ -116,7 +117,7 @@ std::optional<std::int64_t> ShapeTable::findStored(const Wanted& wanted, const s
     return step == SqliteStatement::Step::Failed ? std::nullopt : std::optional(number);
 }
 
-std::optional<std::int64_t> ShapeTable::insert(const Wanted& wanted, const std::string& keys) {
+std::optional<std::int64_t> ShapeTable::insert(const Wanted& wanted, const std::string& keys, std::int64_t seq) {
     insert_.bind(1, static_cast<std::int64_t>(wanted.backend));
     insert_.bindText(2, wanted.name.view());
     insert_.bindText(3, keys);
@@ -129,6 +130,7 @@ std::optional<std::int64_t> ShapeTable::insert(const Wanted& wanted, const std::
     Part& to = part(wanted.backend);
     ++to.shapes;
     to.bytes += static_cast<std::int64_t>(keys.size() + wanted.name.view().size());
+    to.collectBehind = std::min(to.collectBehind, seq);
     return number;
 }
 
@@ -169,6 +171,9 @@ bool ShapeTable::removeUnused(DeliveryBackend backend) {
         }
     }
     list_.reset();
+    if (step == SqliteStatement::Step::Failed) {
+        return false;
+    }
     for (const auto& [number, bytes] : unused) {
         remove_.bind(1, number);
         if (!remove_.run()) {
@@ -178,7 +183,7 @@ bool ShapeTable::removeUnused(DeliveryBackend backend) {
         of.bytes -= bytes;
         std::erase_if(known_, [number = number](const auto& each) { return each.second.number == number; });
     }
-    return step == SqliteStatement::Step::Done;
+    return true;
 }
 
 } // namespace vela::platform

@@ -38,7 +38,7 @@ public:
                                         std::int64_t seq);
     /// The oldest record of a back end has this number now.
     void setOldest(DeliveryBackend backend, std::int64_t seq) { part(backend).oldest = seq; }
-    /// What was done since the last commit is undone; `lastSeq` as for `load`.
+    /// What was done since the last commit is undone, and `setOldest` was called; `lastSeq` as for `load`.
     [[nodiscard]] bool rolledBack(std::int64_t lastSeq);
 
 private:
@@ -83,7 +83,7 @@ private:
     Part& part(DeliveryBackend backend) { return parts_[static_cast<std::size_t>(backend)]; }
     std::optional<std::int64_t> intern(const Wanted& wanted, std::int64_t seq);
     std::optional<std::int64_t> findStored(const Wanted& wanted, const std::string& keys);
-    std::optional<std::int64_t> insert(const Wanted& wanted, const std::string& keys);
+    std::optional<std::int64_t> insert(const Wanted& wanted, const std::string& keys, std::int64_t seq);
     bool hasRoom(const Part& part, std::size_t bytes) const;
     bool removeUnused(DeliveryBackend backend);
     std::unordered_map<std::int64_t, std::int64_t> lastUses(DeliveryBackend backend) const;

@@ -3,12 +3,12 @@
 #include <algorithm>
 #include <charconv>
 #include <chrono>
-#include <compare>
 #include <cstdint>
 #include <ctime>
 #include <filesystem>
 #include <optional>
 #include <system_error>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -19,15 +19,11 @@ namespace {
 constexpr std::string_view kExtension = ".json";
 constexpr std::string_view kTimeForm = "00000000T000000Z"; // 20231114T221320Z
 
-/// A file's name taken apart; ordered by age.
+/// A file's name taken apart.
 struct SnapshotName {
     std::string time;
     std::uint32_t number = 0;
     std::filesystem::path path;
-
-    bool operator<(const SnapshotName& other) const {
-        return std::pair(time, number) < std::pair(other.time, other.number);
-    }
 };
 
 std::string timeText(WallTime time) {
@@ -60,6 +56,43 @@ std::optional<SnapshotName> parse(const std::filesystem::path& path) {
     return error == std::errc() && end == rest.data() + rest.size() ? std::optional(found) : std::nullopt;
 }
 
+std::vector<SnapshotName> namesIn(const std::string& folder) {
+    std::vector<SnapshotName> names;
+    std::error_code error;
+    for (std::filesystem::directory_iterator file(folder, error), end; !error && file != end; file.increment(error)) {
+        if (std::optional<SnapshotName> name = parse(file->path())) {
+            names.push_back(*std::move(name));
+        }
+    }
+    return names;
+}
+
+// The next number of that second, not one that is free again: its record's path would lead to this file.
+std::string newName(const std::string& folder, const std::string& time, const std::vector<SnapshotName>& names) {
+    std::uint32_t number = 0;
+    for (const SnapshotName& name : names) {
+        number = name.time == time ? std::max(number, name.number) : number;
+    }
+    std::string path;
+    std::error_code ignored;
+    while (path.empty() || std::filesystem::exists(path, ignored)) {
+        path = folder + "/" + time + "-" + std::to_string(++number) + std::string(kExtension);
+    }
+    return path;
+}
+
+// Makes room for the file of `time`, which is not among the names.
+void removeOldest(const std::string& time, std::vector<SnapshotName> names) {
+    const auto age = [&time](const SnapshotName& name) {
+        return std::tuple(name.time <= time, std::string_view(name.time), name.number);
+    };
+    std::ranges::sort(names, {}, age);
+    std::error_code ignored;
+    for (std::size_t index = 0; index + SnapshotFolder::kMostFiles < names.size() + 1; ++index) {
+        std::filesystem::remove(names[index].path, ignored);
+    }
+}
+
 } // namespace
 
 SnapshotFolder::SnapshotFolder(std::string path, FileSystem& fileSystem)
@@ -70,36 +103,14 @@ Result<std::string> SnapshotFolder::write(WallTime time, std::string_view conten
     if (Result<Done> made = fileSystem_.createDirectories(path_, 0755); !made) {
         return made.failure();
     }
-    std::string name = freeName(time);
-    if (Result<Done> written = fileSystem_.writeFileAtomically(name, content, 0644); !written) {
+    const std::string text = timeText(time);
+    std::vector<SnapshotName> others = namesIn(path_);
+    std::string path = newName(path_, text, others);
+    if (Result<Done> written = fileSystem_.writeFileAtomically(path, content, 0644); !written) {
         return written.failure();
     }
-    removeOldest();
-    return name;
-}
-
-std::string SnapshotFolder::freeName(WallTime time) const {
-    const std::string start = path_ + "/" + timeText(time) + "-";
-    std::string name;
-    std::error_code ignored;
-    for (std::uint32_t number = 1; name.empty() || std::filesystem::exists(name, ignored); ++number) {
-        name = start + std::to_string(number) + std::string(kExtension);
-    }
-    return name;
-}
-
-void SnapshotFolder::removeOldest() const {
-    std::vector<SnapshotName> names;
-    std::error_code error;
-    for (std::filesystem::directory_iterator file(path_, error), end; !error && file != end; file.increment(error)) {
-        if (std::optional<SnapshotName> name = parse(file->path())) {
-            names.push_back(*std::move(name));
-        }
-    }
-    std::ranges::sort(names, std::less<>());
-    for (std::size_t index = 0; index + kMostFiles < names.size(); ++index) {
-        std::filesystem::remove(names[index].path, error);
-    }
+    removeOldest(text, std::move(others));
+    return path;
 }
 
 } // namespace vela::platform

@@ -1,5 +1,6 @@
-// The files of issue snapshots: `<UTC time>-<number>.json`, the newest kMostFiles of them. Other files of the folder
-// are left alone. Confined to one thread.
+// The files of issue snapshots: `<UTC time>-<number>.json`, the newest kMostFiles of them. A file whose time is after
+// that of the one just written was made before the clock went back, so it counts as the older. Other files of the
+// folder are left alone. Confined to one thread.
 #pragma once
 
 #include "platform/Clock.h"
@@ -23,9 +24,6 @@ public:
     Result<std::string> write(WallTime time, std::string_view content);
 
 private:
-    std::string freeName(WallTime time) const;
-    void removeOldest() const;
-
     const std::string path_;
     FileSystem& fileSystem_;
 };

@@ -154,10 +154,10 @@ TEST_F(StoreBackendsTest, NothingIsThereBeforeTheCommit) {
 TEST_F(StoreBackendsTest, WhatAPayloadHoldsCountsBeforeItIsBuilt) {
     StoreTally tally(*store_, {"*"});
     const LedgerScope scope(entry_);
-    // Nothing of so many bytes has room beside anything else.
+    // Nothing of so many bytes has room in the queue.
     tally.tallySendEventLazy(
         "a", [] { return Dictionary(); }, 32 * 1024 * 1024);
-    EXPECT_EQ(dropped(entry_, DeliveryBackend::Tally, DropReason::QueueFull), 1U);
+    EXPECT_EQ(dropped(entry_, DeliveryBackend::Tally, DropReason::Limit), 1U);
     tally.tallySendEventLazy("a", [] { return Dictionary(); });
     ASSERT_TRUE(store_->commitAll());
     EXPECT_EQ(entry_->counts(DeliveryBackend::Tally).delivered, 1U);

@@ -12,8 +12,14 @@ const Key kSessionID("session_id");
 const Key kServiceName("service_name");
 
 Failure refusal(DropReason reason) {
-    return reason == DropReason::QueueFull ? Failure{ENOBUFS, "the store's queue is full"}
-                                           : Failure{ESHUTDOWN, "the store is closed"};
+    switch (reason) {
+    case DropReason::QueueFull:
+        return {ENOBUFS, "the store's queue is full"};
+    case DropReason::Limit:
+        return {EMSGSIZE, "the message is larger than the store's queue"};
+    default:
+        return {ESHUTDOWN, "the store is closed"};
+    }
 }
 
 } // namespace

@@ -1,6 +1,7 @@
 #include "platform/sqlite/StoreBeacon.h"
 #include "platform/sqlite/StoreHarness_test.h"
 
+#include <cerrno>
 #include <gmock/gmock.h>
 
 namespace vela::platform {
@@ -139,6 +140,17 @@ TEST_F(StoreBeaconTest, MarksAreNotCounted) {
     ASSERT_TRUE(store_->commitAll());
     EXPECT_EQ(ledger_.own()->counts(DeliveryBackend::Beacon), LedgerCounts());
     EXPECT_THAT(query("SELECT * FROM ledger"), IsEmpty());
+}
+
+TEST_F(StoreBeaconTest, AMessageLargerThanTheQueueIsRefusedForItsSize) {
+    const auto session = beacon_.createBeaconSession(sessionInfo_, userInfo_);
+    const std::string text(33 * 1024 * 1024, 'x');
+    const Result<Done> sent = session->sendBeaconMessage(1, 2, {{"text", std::string_view(text)}});
+    ASSERT_FALSE(sent);
+    EXPECT_EQ(sent.failure().code, EMSGSIZE);
+    EXPECT_EQ(sent.failure().description, "the message is larger than the store's queue");
+    EXPECT_EQ(dropped(ledger_.own(), DeliveryBackend::Beacon, DropReason::Limit), 1U);
+    EXPECT_TRUE(session->sendBeaconMessage(1, 2, {{"a", 1}}));
 }
 
 TEST_F(StoreBeaconTest, AMessageForAClosedStoreIsTheCallersToCount) {

@@ -18,8 +18,8 @@ namespace vela::platform {
 namespace {
 
 constexpr std::int64_t kCheckpointPages = 1000;
-constexpr std::size_t kSmallestGroup = 64 * 1024;
-constexpr std::size_t kLargestGroup = 4 * 1024 * 1024;
+constexpr std::int64_t kSmallestGroup = 64 * 1024;
+constexpr std::int64_t kLargestGroup = 4 * 1024 * 1024;
 
 std::int64_t pagesOf(std::uint64_t bytes, std::int64_t pageBytes) {
     return static_cast<std::int64_t>(bytes) / pageBytes;
@@ -57,7 +57,7 @@ ShapeTable::Bounds shapeBounds(std::uint64_t maxBytes) {
 StoreFile::StoreFile(SqliteDatabase database, const Options& options)
     : database_(std::move(database)),
       maxPages_(pagesOf(options.maxBytes, kPageBytes)),
-      groupBytes_(std::clamp(static_cast<std::size_t>(options.maxBytes / 16), kSmallestGroup, kLargestGroup)),
+      groupBytes_(std::clamp(static_cast<std::int64_t>(options.maxBytes / 16), kSmallestGroup, kLargestGroup)),
       largestRow_(static_cast<std::int64_t>(options.maxBytes / 4)),
       shapes_(database_, shapeBounds(options.maxBytes)),
       ledger_(database_) {}
@@ -130,13 +130,13 @@ Result<std::vector<LedgerRow>> StoreFile::ledgerRows() {
     return *std::move(rows);
 }
 
-Result<Done> StoreFile::store(std::span<StoreRecord> records, DeliveryLedger& ledger) {
-    if (Result<Done> bounded = boundLog(); !bounded) {
-        return bounded;
+Result<std::size_t> StoreFile::store(std::span<StoreRecord> records, DeliveryLedger& ledger) {
+    if (const Result<Done> bounded = boundLog(); !bounded) {
+        return bounded.failure();
     }
-    StoredDeliveries deliveries;
-    if (!begin_.run() || !insertAll(records, deliveries) || !makeRoom() || !ledger_.write(ledger, deliveries) ||
-        !finish()) {
+    Group group;
+    if (!begin_.run() || !insertAll(records, group) || !makeRoom(groupBytes_) ||
+        !ledger_.write(ledger, group.deliveries) || !finish()) {
         return rollBack();
     }
     keptSeq_ = lastSeq_;
@@ -149,7 +149,7 @@ Result<Done> StoreFile::store(std::span<StoreRecord> records, DeliveryLedger& le
         // A failure here leaves the log longer; when it grows too long, that is a failure of its own.
         database_.checkpoint(SqliteDatabase::Checkpoint::WhatIsFree);
     }
-    return Done();
+    return group.records;
 }
 
 bool StoreFile::finish() {
@@ -167,6 +167,7 @@ Failure StoreFile::rollBack() {
     ledger_.rolledBack();
     for (StoreTable& table : tables_) {
         table.rolledBack();
+        shapes_.setOldest(table.backend(), table.usage().lastEvicted + 1);
     }
     if (!shapes_.rolledBack(lastSeq_)) {
         failure.description += "; the key lists cannot be read";
@@ -174,33 +175,50 @@ Failure StoreFile::rollBack() {
     return failure;
 }
 
-bool StoreFile::insertAll(std::span<StoreRecord> records, StoredDeliveries& deliveries) {
-    const bool inserted =
-        std::ranges::all_of(records, [&](StoreRecord& record) { return insert(record, deliveries); }) &&
-        std::ranges::all_of(tables_, [](StoreTable& table) { return table.writeRows(); });
+bool StoreFile::insertAll(std::span<StoreRecord> records, Group& group) {
+    Insertion last = Insertion::Done;
+    for (StoreRecord& record : records) {
+        last = insert(record, group);
+        if (last != Insertion::Done) {
+            break;
+        }
+        ++group.records;
+    }
     encoded_ = Dictionary();
-    return inserted;
+    return last != Insertion::Failed &&
+           std::ranges::all_of(tables_, [](StoreTable& table) { return table.writeRows(); });
 }
 
-bool StoreFile::insert(StoreRecord& record, StoredDeliveries& deliveries) {
+// A payload's text may be many times as long as what the queue counted it for, so its bytes are known only here.
+StoreFile::Insertion StoreFile::insert(StoreRecord& record, Group& group) {
+    record.refused.reset(); // by an attempt that failed, in which its keys stood in its row
     const std::int64_t seq = lastSeq_ + 1;
     const std::optional<std::int64_t> shape = shapes_.shapeOf(record.backend, record.name, record.payload, seq);
     if (!shape) {
-        return false;
+        return Insertion::Failed;
     }
     const std::string_view values = encode(record.payload, *shape == ShapeTable::kNoShape);
-    if (StoreTable::rowBytes(values.size(), record.name.view().size(), record.bytes.size()) > largestRow_) {
+    const std::int64_t bytes = StoreTable::rowBytes(values.size(), record.name.view().size(), record.bytes.size());
+    if (bytes > largestRow_) {
         record.refused = DropReason::Limit;
-        return true;
+        return Insertion::Done;
+    }
+    if (group.bytes > 0 && group.bytes + bytes > groupBytes_) {
+        return Insertion::TooMuch;
+    }
+    // More than every transaction leaves free for the next; nothing waits to be written yet.
+    if (bytes > groupBytes_ && !makeRoom(bytes)) {
+        return Insertion::Failed;
     }
     if (!tables_[static_cast<std::size_t>(record.backend)].insert(record, {seq, *shape, values})) {
-        return false;
+        return Insertion::Failed;
     }
     lastSeq_ = seq;
+    group.bytes += bytes;
     if (record.entry != nullptr) {
-        deliveries.add(*record.entry, record.backend);
+        group.deliveries.add(*record.entry, record.backend);
     }
-    return true;
+    return Insertion::Done;
 }
 
 // The two analytics events of a message say the same and come one behind the other.

@@ -1,4 +1,4 @@
-// The store's open file: one transaction after another of whole groups of records with the ledger's accounts.
+// The store's open file: one transaction after another of groups of records with the ledger's accounts.
 //
 // The size stays below a bound: when the pages in use come near it, the oldest records go, first those of the back end
 // that is furthest above its share. What a back end leaves of its share others may use until it wants it. Confined to
@@ -40,29 +40,37 @@ public:
 
     Result<std::vector<LedgerRow>> ledgerRows();
 
-    /// Stores the records and the ledger's changes: all or nothing. A record that is too large for this file is marked
-    /// as refused and left out.
-    Result<Done> store(std::span<StoreRecord> records, DeliveryLedger& ledger);
+    /// Stores the first of the records, as many as one transaction takes, and the ledger's changes: all or nothing.
+    /// Answers how many; 0 only of none. A record that is too large for this file is among them, marked as refused and
+    /// left out.
+    Result<std::size_t> store(std::span<StoreRecord> records, DeliveryLedger& ledger);
 
     /// By number of the back end, as of the last commit.
     std::array<StoreUsage, kDeliveryBackends> usage() const;
     /// Of the file, without its log.
     std::uint64_t fileBytes() const { return static_cast<std::uint64_t>(pages_) * kPageBytes; }
-    /// Records of more bytes together are better stored in several transactions.
-    std::size_t groupBytes() const { return groupBytes_; }
+    /// Rows of more bytes together are stored in several transactions.
+    std::size_t groupBytes() const { return static_cast<std::size_t>(groupBytes_); }
 
 private:
     static constexpr std::int64_t kPageBytes = 4096;
+    /// What one transaction takes up.
+    struct Group {
+        std::size_t records = 0; ///< the refused ones among them
+        std::int64_t bytes = 0;  ///< of their rows
+        StoredDeliveries deliveries;
+    };
+    enum class Insertion : std::uint8_t { Done, TooMuch, Failed };
 
     StoreFile(SqliteDatabase database, const Options& options);
     Result<Done> prepare(const std::string& path);
     bool loadTables();
 
-    bool insertAll(std::span<StoreRecord> records, StoredDeliveries& deliveries);
-    bool insert(StoreRecord& record, StoredDeliveries& deliveries);
+    bool insertAll(std::span<StoreRecord> records, Group& group);
+    Insertion insert(StoreRecord& record, Group& group);
     std::string_view encode(const Dictionary& payload, bool withKeys);
 
-    bool makeRoom();
+    bool makeRoom(std::int64_t bytes);
     bool evictPiece(std::int64_t bytes);
     bool measure();
     bool shrink();
@@ -73,7 +81,7 @@ private:
 
     SqliteDatabase database_;
     const std::int64_t maxPages_;
-    const std::size_t groupBytes_;
+    const std::int64_t groupBytes_;
     const std::int64_t largestRow_;
     ShapeTable shapes_;
     LedgerTable ledger_;

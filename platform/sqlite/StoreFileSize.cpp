@@ -26,10 +26,10 @@ bool StoreFile::measure() {
     return measured;
 }
 
-// What is in use stays so far below the bound that the next group finds room below it too.
-bool StoreFile::makeRoom() {
+// What is in use stays so far below the bound that rows of so many bytes find room below it too.
+bool StoreFile::makeRoom(std::int64_t bytes) {
     constexpr int kMostPieces = 256; // a table of bytes that are wrongly estimated must not keep us here
-    const std::int64_t reserve = static_cast<std::int64_t>(groupBytes_) / kPageBytes * 5 / 4 + 16;
+    const std::int64_t reserve = bytes / kPageBytes * 5 / 4 + 16;
     const std::int64_t limit = std::max<std::int64_t>(maxPages_ - reserve, maxPages_ / 2);
     if (!measure()) {
         return false;
@@ -68,7 +68,7 @@ bool StoreFile::shrink() {
     if (pages_ <= maxPages_) {
         return true;
     }
-    if (!begin_.run() || !makeRoom() || !finish()) {
+    if (!begin_.run() || !makeRoom(groupBytes_) || !finish()) {
         return false;
     }
     for (StoreTable& table : tables_) {

@@ -180,6 +180,35 @@ TEST_F(SnapshotFolderTest, TheTenthFileOfASecondIsNewerThanTheSecond) {
     EXPECT_THAT(names(), Contains("20231114T221320Z-33.json"));
 }
 
+TEST_F(SnapshotFolderTest, ANumberIsNotGivenToAnotherFile) {
+    for (int number = 0; number < 33; ++number) {
+        ASSERT_TRUE(folder_.write(time_, "x"));
+    }
+    EXPECT_EQ(*folder_.write(time_, "x"), path_ + "/20231114T221320Z-34.json");
+    EXPECT_THAT(names(), Contains("20231114T221320Z-34.json"));
+    EXPECT_THAT(names(), Not(Contains("20231114T221320Z-2.json")));
+    EXPECT_EQ(names().size(), 32U);
+}
+
+// A device without a battery for its clock starts in 1970.
+TEST_F(SnapshotFolderTest, FilesThatAreWrittenAfterTheClockWentBackAreKept) {
+    for (int second = 0; second < 32; ++second) {
+        ASSERT_TRUE(folder_.write(time_ + std::chrono::seconds(second), "x"));
+    }
+    EXPECT_EQ(*folder_.write(WallTime(), "a"), path_ + "/19700101T000000Z-1.json");
+    EXPECT_EQ(*folder_.write(WallTime(std::chrono::seconds(5)), "b"), path_ + "/19700101T000005Z-1.json");
+    const std::vector<std::string> left = names();
+    ASSERT_EQ(left.size(), 32U);
+    EXPECT_EQ(left[0], "19700101T000000Z-1.json");
+    EXPECT_EQ(left[1], "19700101T000005Z-1.json");
+    EXPECT_EQ(left[2], "20231114T221322Z-1.json");
+    EXPECT_EQ(left[31], "20231114T221351Z-1.json");
+    // The clock was set.
+    ASSERT_TRUE(folder_.write(time_ + std::chrono::seconds(60), "c"));
+    EXPECT_EQ(names().front(), "19700101T000005Z-1.json");
+    EXPECT_EQ(names().back(), "20231114T221420Z-1.json");
+}
+
 TEST_F(SnapshotFolderTest, OtherFilesAreLeftAlone) {
     ASSERT_TRUE(folder_.write(time_, "x"));
     for (const std::string name : {"notes.json", "20231114T221320Z-x.json", "20231114T221320Z-1.json.bak", "a"}) {

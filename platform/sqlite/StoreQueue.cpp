@@ -16,6 +16,9 @@ std::optional<DropReason> StoreQueue::push(StoreRecord& record) {
         if (closed_) {
             return DropReason::Restart;
         }
+        if (record.weight > limits_.bytes) {
+            return DropReason::Limit; // it would find no room in an empty queue either
+        }
         if (held_ >= limits_.records || record.weight > limits_.bytes - heldBytes_) {
             return DropReason::QueueFull;
         }

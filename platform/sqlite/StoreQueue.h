@@ -27,7 +27,7 @@ public:
         std::size_t group = 64; ///< records that are committed together
     };
     /// A backlog waits in pieces of so many, whose memory goes round.
-    static constexpr std::size_t kPiece = 1024;
+    static constexpr std::size_t kPiece = 4096;
 
     /// What the writer decides by.
     struct State {

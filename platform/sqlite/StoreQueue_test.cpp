@@ -70,11 +70,13 @@ TEST_F(StoreQueueTest, MoreBytesThanItHoldsAreRefused) {
     EXPECT_EQ(push(queue, record()), std::nullopt);
 }
 
-TEST_F(StoreQueueTest, ARecordLargerThanAllItsRoomIsRefused) {
+TEST_F(StoreQueueTest, ARecordLargerThanAllItsRoomIsRefusedForItsSize) {
     StoreQueue queue({.records = 100, .bytes = 1'000, .group = 100});
     StoreRecord large = record();
     large.bytes = std::string(1'000, 'x');
-    EXPECT_EQ(queue.push(large), DropReason::QueueFull);
+    EXPECT_EQ(queue.push(large), DropReason::Limit);
+    EXPECT_EQ(large.bytes.size(), 1'000U);
+    EXPECT_EQ(queue.held(), 0U);
 }
 
 TEST_F(StoreQueueTest, TheWriterIsWokenForTheFirstRecordAndForAFullGroup) {
@@ -131,7 +133,7 @@ TEST_F(StoreQueueTest, AFlushThatWasAnsweredIsNotWaitedFor) {
 }
 
 TEST_F(StoreQueueTest, ABacklogComesOutInPiecesInTheOrderPushed) {
-    StoreQueue queue({.records = 10'000, .bytes = 100 * 1024 * 1024, .group = 64});
+    StoreQueue queue({.records = 20'000, .bytes = 100 * 1024 * 1024, .group = 64});
     std::int64_t pushed = 0;
     std::int64_t expected = 0;
     std::vector<StoreRecord> taken;
@@ -149,23 +151,23 @@ TEST_F(StoreQueueTest, ABacklogComesOutInPiecesInTheOrderPushed) {
         }
         EXPECT_EQ(queue.state().waiting, static_cast<std::size_t>(pushed - expected));
     };
-    pushMore(2'500);
-    takePiece(1'024);
-    pushMore(100);
-    takePiece(1'024);
-    pushMore(1'000);
-    takePiece(1'024);
-    takePiece(528);
+    pushMore(10'000);
+    takePiece(4'096);
+    pushMore(400);
+    takePiece(4'096);
+    pushMore(4'000);
+    takePiece(4'096);
+    takePiece(2'112);
     takePiece(0);
     pushMore(1);
     takePiece(1);
 }
 
 TEST_F(StoreQueueTest, AnUrgencyStandsUntilAllIsTaken) {
-    StoreQueue queue({.records = 10'000, .bytes = 100 * 1024 * 1024, .group = 64});
+    StoreQueue queue({.records = 20'000, .bytes = 100 * 1024 * 1024, .group = 64});
     StoreRecord urgent = record();
     urgent.urgency = StoreUrgency::Now;
-    for (int count = 0; count < 2'000; ++count) {
+    for (int count = 0; count < 8'000; ++count) {
         push(queue, record());
     }
     push(queue, std::move(urgent));
@@ -178,13 +180,13 @@ TEST_F(StoreQueueTest, AnUrgencyStandsUntilAllIsTaken) {
 }
 
 TEST_F(StoreQueueTest, AGroupOfTheSettingsIsOnePiece) {
-    StoreQueue queue({.records = 10'000, .bytes = 100 * 1024 * 1024, .group = 3'000});
-    for (int count = 0; count < 4'000; ++count) {
+    StoreQueue queue({.records = 20'000, .bytes = 100 * 1024 * 1024, .group = 6'000});
+    for (int count = 0; count < 8'000; ++count) {
         push(queue, record());
     }
     std::vector<StoreRecord> taken;
     queue.take(taken);
-    EXPECT_EQ(taken.size(), 3'000U);
+    EXPECT_EQ(taken.size(), 6'000U);
 }
 
 } // namespace

@@ -88,10 +88,11 @@ bool StoreTable::writeRows() {
         }
         written = insertTogether_.run();
     } else {
-        for (const WaitingRow& row : waiting_) {
+        // Not one row more than up to a failure: binding it would clear the failure's text.
+        written = std::ranges::all_of(waiting_, [this](const WaitingRow& row) {
             bind(insert_, 0, row);
-            written = written && insert_.run();
-        }
+            return insert_.run();
+        });
     }
     forgetRows();
     return written;

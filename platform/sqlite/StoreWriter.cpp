@@ -130,7 +130,7 @@ bool StoreWriter::commitWaiting(MonotonicTime now) {
 
 // Tries the disk with the ledger alone, so that another failure costs no delivery.
 bool StoreWriter::probe(MonotonicTime now) {
-    const Result<Done> stored = attempt({});
+    const Result<std::size_t> stored = attempt({});
     if (!stored) {
         noteFailure(stored.failure(), now);
     }
@@ -167,9 +167,9 @@ bool StoreWriter::store(std::span<StoreRecord> group, MonotonicTime now) {
             record.builder.reset();
         }
     }
-    const Result<Done> stored = attempt(group);
+    const Result<std::size_t> stored = attempt(group);
     // Of a failed commit only the first are given up; the others wait for an attempt that works.
-    settle(stored ? group : group.first(std::min(group.size(), options_.commitMessages)), static_cast<bool>(stored));
+    settle(group.first(stored ? *stored : std::min(group.size(), options_.commitMessages)), static_cast<bool>(stored));
     if (stored) {
         noteSuccess();
     } else {
@@ -178,10 +178,10 @@ bool StoreWriter::store(std::span<StoreRecord> group, MonotonicTime now) {
     return static_cast<bool>(stored);
 }
 
-Result<Done> StoreWriter::attempt(std::span<StoreRecord> group) {
+Result<std::size_t> StoreWriter::attempt(std::span<StoreRecord> group) {
     if (file_ == nullptr) {
-        if (Result<Done> opened = openFile(); !opened) {
-            return opened;
+        if (const Result<Done> opened = openFile(); !opened) {
+            return opened.failure();
         }
     }
     return file_->store(group, ledger_);
@@ -203,6 +203,15 @@ void StoreWriter::settle(std::span<StoreRecord> group, bool stored) {
         }
     }
     settled_ += group.size();
+    // What the queue has room for again must not be held here any more, while commits fail say.
+    if (settled_ == taken_.size()) {
+        taken_.clear();
+        settled_ = 0;
+    } else {
+        for (StoreRecord& each : group) {
+            each = StoreRecord();
+        }
+    }
     queue_.release(group.size(), bytes);
 }
 

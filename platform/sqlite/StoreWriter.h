@@ -71,7 +71,7 @@ private:
     std::span<StoreRecord> nextGroup();
     bool store(std::span<StoreRecord> group, MonotonicTime now);
     Result<Done> openFile();
-    Result<Done> attempt(std::span<StoreRecord> group);
+    Result<std::size_t> attempt(std::span<StoreRecord> group);
     void settle(std::span<StoreRecord> group, bool stored);
     void noteFailure(const Failure& failure, MonotonicTime now);
     void noteSuccess();

@@ -199,6 +199,51 @@ TEST_F(StoreWriterTest, OfSeveralGroupsOnlyTheOneThatFailedIsDropped) {
     EXPECT_EQ(delivered(), 5U);
 }
 
+// Their room in the queue is free for others.
+TEST_F(StoreWriterTest, RecordsThatWereDroppedAreNotHeldWhileOthersWaitForTheDisk) {
+    open();
+    const long others = entry_.use_count();
+    disk_.fail(SQLITE_FULL);
+    push(8);
+    EXPECT_EQ(entry_.use_count(), others + 8);
+    run(0);
+    EXPECT_EQ(queue_.held(), 5U);
+    EXPECT_EQ(entry_.use_count(), others + 5);
+}
+
+TEST_F(StoreWriterTest, NothingIsHeldWhenAllThatWaitedWasDropped) {
+    open();
+    const long others = entry_.use_count();
+    disk_.fail(SQLITE_FULL);
+    push(3);
+    run(0);
+    EXPECT_EQ(queue_.held(), 0U);
+    EXPECT_EQ(entry_.use_count(), others);
+}
+
+// JSON says a control character with six, so that the file takes fewer in one transaction than the writer gives it.
+TEST_F(StoreWriterTest, ABacklogOfRecordsThatBecomeLongIsStoredWhole) {
+    options_.file.maxBytes = 4 * 1024 * 1024;
+    StoreQueue queue({});
+    StoreWriter writer(options_, queue, ledger_);
+    ASSERT_TRUE(writer.open(at(0)));
+    std::vector<bool> outcomes;
+    for (int number = 0; number < 20; ++number) {
+        StoreRecord record;
+        record.payload = {{"text", std::string_view(std::string(10'000, '\x01'))}};
+        record.entry = entry_;
+        record.done = [&outcomes](bool stored) { outcomes.push_back(stored); };
+        entry_->received(DeliveryBackend::Beacon);
+        ASSERT_EQ(queue.push(record), std::nullopt);
+    }
+    writer.run(at(0));
+    EXPECT_EQ(outcomes, std::vector<bool>(20, true));
+    EXPECT_EQ(delivered(), 20U);
+    EXPECT_EQ(queue.held(), 0U);
+    EXPECT_THAT(query("SELECT count(*), sum(length(vals)) FROM beacon"), ElementsAre("20|1200080"));
+    EXPECT_THAT(keptLedger(), ElementsAre("20|20|0"));
+}
+
 TEST_F(StoreWriterTest, TheQueueIsBoundedWhileTheDiskFails) {
     open();
     disk_.fail(SQLITE_FULL);
