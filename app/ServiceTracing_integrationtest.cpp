@@ -4,13 +4,16 @@
 #include "app/ForkedClient_integrationtest.h"
 #include "app/RunningService_integrationtest.h"
 
+#include <algorithm>
 #include <array>
 #include <chrono>
 #include <cstdint>
+#include <filesystem>
 #include <fstream>
 #include <grp.h>
 #include <map>
 #include <pwd.h>
+#include <thread>
 #include <vela/trace.h>
 
 namespace vela {
@@ -126,30 +129,135 @@ std::string tracedRun() {
     return difference.empty() ? differenceOf(results["second"], secondBounds) : difference;
 }
 
+/// Deliveries of the energy log in a service's store, whether it runs or not.
+std::size_t storedJoules(const RunningService& service) {
+    const testing::ProgramRun run = service.velactl(
+        {"deliveries", "--backend", "joule", "--json", "--set", "paths.state=" + service.folder("state")});
+    return static_cast<std::size_t>(std::ranges::count(run.out, '\n'));
+}
+
 TEST(ServiceTracingTest, IntervalsOfTwoProcessesAgreeWithTheirOwnClock) { EXPECT_EQ(tracedRun(), ""); }
 
-TEST(ServiceTracingTest, IntervalsAgreeForAnOrdinaryUserToo) {
+/// What outcomes begin with where there is no such user.
+constexpr std::string_view kCannot = "cannot ";
+
+/// What `run` answers in a process of an ordinary user.
+std::string outcomeAsOrdinaryUser(std::string (*run)()) {
     const passwd* const other = getpwnam(kOtherUser); // NOLINT(concurrency-mt-unsafe): one thread
     if (geteuid() != 0 || other == nullptr) {
-        GTEST_SKIP() << "only root can become " << kOtherUser << "; an ordinary user runs the other test like this";
+        return "cannot become " + std::string(kOtherUser);
     }
-    const ForkedClient user([other](const ForkedClient::Report& report) {
+    const ForkedClient user([other, run](const ForkedClient::Report& report) {
         if (setgroups(0, nullptr) != 0 || setresgid(other->pw_gid, other->pw_gid, other->pw_gid) != 0 ||
             setresuid(other->pw_uid, other->pw_uid, other->pw_uid) != 0) {
-            report("cannot become another user");
+            report("no user is taken");
         } else if (access(VELA_REPORTINGD, X_OK) != 0) {
-            report("cannot reach the program");
+            report(std::string(kCannot) + "run " + VELA_REPORTINGD);
         } else {
-            const std::string problem = tracedRun();
-            report(problem.empty() ? "agree" : problem);
+            const std::string problem = run();
+            report(problem.empty() ? "well" : problem);
         }
         ForkedClient::stay();
     });
     const std::string outcome = user.report();
-    if (outcome == "cannot reach the program") {
-        GTEST_SKIP() << kOtherUser << " may not run " << VELA_REPORTINGD;
+    return outcome == "well" ? "" : outcome.empty() ? "it ended without an outcome" : outcome;
+}
+
+TEST(ServiceTracingTest, IntervalsAgreeForAnOrdinaryUserToo) {
+    const std::string outcome = outcomeAsOrdinaryUser(&tracedRun);
+    if (outcome.starts_with(kCannot)) {
+        GTEST_SKIP() << outcome << "; an ordinary user runs the other test like this";
     }
-    EXPECT_EQ(outcome, "agree");
+    EXPECT_EQ(outcome, "");
+}
+
+/// A process that loses three events on purpose; its report says "lost", or "no ring" where it needs none.
+ForkedClient loser(const RunningService& service) {
+    return ForkedClient([&service](const ForkedClient::Report& report) {
+        setenv("VELA_RUNTIME", service.folder("runtime").c_str(), 1); // NOLINT(concurrency-mt-unsafe): one thread
+        const std::string rings = service.folder("runtime/trace/rings");
+        vela_trace_emit(kFirstBegin);
+        if (std::filesystem::is_empty(rings)) {
+            report("no ring");
+            ForkedClient::stay();
+        }
+        std::filesystem::rename(rings, rings + "-away"); // where no thread can make a ring
+        std::thread([] {
+            for (int i = 0; i < 3; ++i) {
+                vela_trace_emit(kFirstBegin + kToEnd);
+            }
+        }).join();
+        std::filesystem::rename(rings + "-away", rings);
+        report("lost");
+        ForkedClient::stay();
+    });
+}
+
+/// Runs a trace that loses events, and answers what is wrong with what it tells, or "".
+std::string losingRun() {
+    const RunningService service({R"(features."AudioAnalytics/Tracing"=true)"});
+    const std::string parameters = service.folder("points.plist");
+    std::ofstream(parameters) << kParameters;
+    ServiceClient client = service.client();
+    client.call("createReportingSession", "[42]");
+    client.call("setServiceType", "[11,42]");
+    client.call("setConfiguration", R"([{"VelaReportingKilnPlistFilePath":")" + parameters + R"("},42])");
+    client.call("startReportingSessionForID", "[42]");
+    const ForkedClient emitter = loser(service);
+    const std::string outcome = emitter.report();
+    if (outcome != "lost" || client.call("stopReportingSessionForID", "[42]") != "true") {
+        return outcome;
+    }
+    auto results = resultsOf(service.root() + kResults);
+    const std::vector<std::int64_t> lost = results["lost events"];
+    if (results.size() != 1 || lost != std::vector<std::int64_t>{3}) {
+        return "the results do not tell of three lost events; the service said:\n" + service.log();
+    }
+    return service.linesWith("3 trace events were lost") == 1 ? "" : "the log does not tell:\n" + service.log();
+}
+
+// An ordinary user's events go through rings.
+TEST(ServiceTracingTest, LostEventsAreToldInTheLogAndInTheResults) {
+    const std::string outcome = geteuid() == 0 ? outcomeAsOrdinaryUser(&losingRun) : losingRun();
+    if (outcome.starts_with(kCannot)) {
+        GTEST_SKIP() << outcome;
+    }
+    EXPECT_EQ(outcome, "");
+}
+
+// What was committed is still there, and nothing runs into what another thread destroys.
+TEST(ServiceTracingTest, AServiceThatCannotLeaveItsResultsEndsWithOneAndKeepsWhatItDelivered) {
+    RunningService service({R"(features."AudioAnalytics/Tracing"=true)", "device.InternalBuild=true",
+                            "store.commit_ms=20", "drivers.Tarn=[]", "drivers.Rx=[]", "drivers.Tx=[]",
+                            "drivers.Haptics=[]"});
+    const std::filesystem::path folder = std::filesystem::path(service.root() + kResults).parent_path();
+    std::filesystem::create_directories(folder.parent_path());
+    std::ofstream(folder) << "no folder";
+    const std::string parameters = service.folder("points.plist");
+    std::ofstream(parameters) << kParameters;
+    ServiceClient client = service.client();
+    for (const char* const id : {"1", "2"}) {
+        client.call("createReportingSession", "[" + std::string(id) + "]");
+        client.call("setServiceType", std::string("[") + (*id == '1' ? "\"haptics\"" : "11") + "," + id + "]");
+    }
+    client.call("startReportingSessionForID", "[1]");
+    for (int message = 0; message < 100; ++message) {
+        client.call("sendMessage",
+                    R"([{"EngineOnTime":)" + std::to_string(message) + R"(},"Performance","Joule",[1]])");
+    }
+    ASSERT_TRUE(testing::waitUntil([&] { return storedJoules(service) == 100; }));
+
+    client.call("setConfiguration", R"([{"VelaReportingKilnPlistFilePath":")" + parameters + R"("},2])");
+    EXPECT_EQ(client.call("startReportingSessionForID", "[2]"), "true");
+    client.send("stopReportingSessionForID", "[2]");
+    EXPECT_EQ(service.program().waitForEnd(), 1);
+    EXPECT_EQ(service.linesWith("Failed to open metricsheet writer"), 1U) << service.log();
+    EXPECT_EQ(service.linesWith("can't create logging directory at " + folder.string() + ": create folder " +
+                                folder.string() + ": Not a directory"),
+              1U);
+    EXPECT_EQ(storedJoules(service), 100U);
+    service.start();
+    EXPECT_EQ(storedJoules(service), 100U);
 }
 
 } // namespace

@@ -5,6 +5,7 @@
 #include "app/ServicePlatform.h"
 #include "platform/dbus/ServiceEndpoint.h"
 #include "platform/host/HostFacts.h"
+#include "platform/linux/DescriptorLimit.h"
 #include "platform/linux/LinuxFileSystem.h"
 #include "platform/linux/ServiceManager.h"
 #include "platform/toml/SettingsLoading.h"
@@ -13,7 +14,6 @@
 #include <csignal>
 #include <cstdlib>
 #include <iostream>
-#include <sys/resource.h>
 
 namespace {
 
@@ -46,19 +46,10 @@ int check(const CommandLine& line, const platform::LoadedSettings& loaded) {
                  isSomethingMissing(findings) ? EXIT_FAILURE : EXIT_SUCCESS);
 }
 
-/// Connections are bounded by settings; a soft limit that old programs need shall not be the narrower one.
-void raiseDescriptorLimit() {
-    rlimit limit{};
-    if (getrlimit(RLIMIT_NOFILE, &limit) == 0 && limit.rlim_cur < limit.rlim_max) {
-        limit.rlim_cur = limit.rlim_max;
-        setrlimit(RLIMIT_NOFILE, &limit);
-    }
-}
-
 /// Does not come back: what sessions left queued must not find the service half taken down.
 [[noreturn]] void serve(const Settings& settings, platform::ServiceManager& manager) {
     platform::DbusServiceEndpoint::blockEndSignals(); // before there are other threads
-    raiseDescriptorLimit();
+    platform::raiseDescriptorLimit();
     ServicePlatform servicePlatform(settings);
     ServiceHost host(settings, servicePlatform, manager);
     const platform::Result<platform::Done> served = host.serve();

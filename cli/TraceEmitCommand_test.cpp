@@ -62,7 +62,8 @@ TEST_F(TraceEmitCommandTest, AnEventReachesTheSession) {
     ASSERT_EQ(session->eventsRange(0x21040100, 0x21040101, [&](const auto& event) { events.push_back(event); }), 0);
     ASSERT_EQ(session->start(*queue_), 0);
     for (const Outcome& outcome :
-         {emit({"0x21040100", "1", "0xFF", "18446744073709551615", "7"}), emit({"--", "553910529", "-1"})}) {
+         {emit({"0x21040100", "1", "0xFF", "18446744073709551615", "7"}), emit({"--", "553910529", "-1"}),
+          emit({"0x21040101", "-5", "-9223372036854775808"})}) {
         EXPECT_EQ(outcome.status, kDone);
         EXPECT_EQ(outcome.out + outcome.error, "");
     }
@@ -71,11 +72,12 @@ TEST_F(TraceEmitCommandTest, AnEventReachesTheSession) {
     EXPECT_EQ(other.error, "velactl: nobody collects events with this code\n");
     EXPECT_EQ(session->end(), 0);
     ASSERT_TRUE(testing::waitUntil([&] { return completed.load(); }));
-    ASSERT_EQ(events.size(), 2U);
+    ASSERT_EQ(events.size(), 3U);
     EXPECT_EQ(events[0].eventCode, 0x21040100U);
     EXPECT_THAT(events[0].arguments, ElementsAre(1, 255, 18446744073709551615U, 7));
     EXPECT_EQ(events[1].eventCode, 0x21040101U);
     EXPECT_THAT(events[1].arguments, ElementsAre(18446744073709551615U, 0, 0, 0));
+    EXPECT_THAT(events[2].arguments, ElementsAre(18446744073709551611U, 9223372036854775808U, 0, 0));
 }
 
 TEST_F(TraceEmitCommandTest, ItSaysWhenNobodyCollects) {
@@ -110,6 +112,10 @@ TEST_F(TraceEmitCommandTest, WrongUsageIsOneLineAndTwo) {
         EXPECT_EQ(emit({"--", "1", argument}).status, kWrongUsage) << argument;
     }
     EXPECT_EQ(emit({"--jsn", "1"}).status, kWrongUsage);
+    EXPECT_THAT(emit({"-5"}).error,
+                StartsWith("velactl: a code is a number of 32 bits, such as 0x21040100, and not -5;"));
+    EXPECT_THAT(emit({"1", "-5x"}).error, StartsWith("velactl: an argument is a number of 64 bits, and not -5x;"));
+    EXPECT_THAT(emit({"1", "-x"}).error, StartsWith("velactl: there is no option -x;"));
 }
 
 } // namespace

@@ -10,6 +10,7 @@
 #include <cmath>
 #include <istream>
 #include <map>
+#include <numeric>
 #include <utility>
 
 namespace vela {
@@ -107,7 +108,7 @@ TraceSummary summarize(std::vector<double> values) {
     std::ranges::sort(values);
     const std::size_t count = values.size();
     const double middle = values[count / 2];
-    const double median = count % 2 == 1 ? middle : values[count / 2 - 1] + (middle - values[count / 2 - 1]) / 2;
+    const double median = count % 2 == 1 ? middle : std::midpoint(values[count / 2 - 1], middle);
     // The 99th of 100, the last of fewer.
     const std::size_t rank = (99 * count + 99) / 100;
     return {count, values.front(), median, values[rank - 1], values.back()};
@@ -120,12 +121,13 @@ std::vector<TraceBucket> histogramOf(const std::vector<double>& values) {
     if (least == greatest) {
         return {{least, greatest, values.size()}};
     }
-    const bool byRatio = least > 0 && greatest / least >= kRatio;
+    const double ratio = least > 0 ? greatest / least : 0;
+    const bool byRatio = ratio >= kRatio && std::isfinite(ratio);
     std::vector<TraceBucket> buckets(kBuckets);
     for (std::size_t i = 0; i < kBuckets; ++i) {
         const double part = static_cast<double>(i + 1) / kBuckets;
         buckets[i].from = i == 0 ? least : buckets[i - 1].to;
-        buckets[i].to = byRatio ? least * std::pow(greatest / least, part) : least + (greatest - least) * part;
+        buckets[i].to = byRatio ? least * std::pow(ratio, part) : std::lerp(least, greatest, part);
     }
     buckets.back().to = greatest;
     for (const double value : values) {

@@ -3,6 +3,7 @@
 #include "cli/TraceReport.h"
 #include "testing/TemporaryFolder.h"
 
+#include <cmath>
 #include <fstream>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -166,6 +167,24 @@ TEST(TraceReportTest, EveryValueIsInOneBucket) {
     EXPECT_EQ(total(histogramOf(values)), values.size());
 }
 
+TEST(TraceReportTest, TheSmallestAndTheLargestNumbersHaveBoundsThatAreNumbers) {
+    const auto tiny = histogramOf({5e-324, 1e300});
+    ASSERT_EQ(tiny.size(), 10U);
+    EXPECT_EQ(tiny[0].from, 5e-324);
+    EXPECT_DOUBLE_EQ(tiny[0].to, 1e299);
+    EXPECT_EQ(tiny[0].count, 1U);
+    EXPECT_EQ(tiny[9].to, 1e300);
+    EXPECT_EQ(tiny[9].count, 1U);
+    const auto wide = histogramOf({-1.5e308, 1.5e308});
+    EXPECT_DOUBLE_EQ(wide[0].to, -1.2e308);
+    EXPECT_EQ(wide[9].to, 1.5e308);
+    for (const TraceBucket& bucket : wide) {
+        EXPECT_TRUE(std::isfinite(bucket.from) && std::isfinite(bucket.to));
+    }
+    EXPECT_EQ(total(wide), 2U);
+    EXPECT_EQ(summarize({-1.5e308, 1.5e308}).median, 0);
+}
+
 TEST(TraceReportTest, DurationsHaveAUnitThatFits) {
     EXPECT_EQ(durationText(0), "0 ns");
     EXPECT_EQ(durationText(1), "1 ns");
@@ -268,6 +287,14 @@ TEST_F(TraceReportCommandTest, OtherUnitsStandAsTheyAre) {
                   std::string(kHeading) + "{\"name\":\"size\",\"value\":1500.5,\"unit\":\"bytes\"}\n"),
               kDone);
     EXPECT_THAT(out_, HasSubstr("size      1      1500.5 bytes  1500.5 bytes"));
+}
+
+TEST_F(TraceReportCommandTest, TheSmallestAndTheLargestNumbersArePrintedAsNumbers) {
+    const std::string file = kHeading + line("a", "5e-324") + line("a", "1e300");
+    EXPECT_EQ(run({"trace", "report", "-"}, file), kDone);
+    EXPECT_EQ(out_.find("inf"), std::string::npos) << out_;
+    EXPECT_EQ(run({"trace", "report", "--json", "-"}, file), kDone);
+    EXPECT_EQ(out_.find("null"), std::string::npos) << out_;
 }
 
 TEST_F(TraceReportCommandTest, NamesCannotBreakALine) {

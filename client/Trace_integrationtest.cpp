@@ -4,9 +4,14 @@
 #include "client/include/vela/trace.h"
 #include "testing/RunProgram.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <csignal>
 #include <gmock/gmock.h>
+#include <sys/time.h>
+#include <sys/wait.h>
 #include <thread>
+#include <unistd.h>
 
 namespace vela::client {
 
@@ -51,6 +56,38 @@ TEST_F(TraceTest, ErrnoStays) {
     vela_trace_emit(0x21040100);
     EXPECT_EQ(errno, 1234);
     EXPECT_EQ(finish().size(), 2U);
+}
+
+volatile std::sig_atomic_t interruptions = 0;
+
+void emitInHandler(int) {
+    interruptions = interruptions + 1;
+    vela_trace_emit(0x21040101);
+}
+
+// In a process that has emitted nothing yet: what is under way then holds locks and allocates.
+TEST_F(TraceTest, ASignalsHandlerMayEmitInTheMidstOfTheFirstEvent) {
+    start();
+    const pid_t child = fork();
+    if (child == 0) {
+        struct sigaction action {};
+        action.sa_handler = emitInHandler;
+        sigaction(SIGALRM, &action, nullptr);
+        const itimerval often{{0, 100}, {0, 50}};
+        const itimerval never{};
+        setitimer(ITIMER_REAL, &often, nullptr);
+        vela_trace_emit(0x21040100);
+        setitimer(ITIMER_REAL, &never, nullptr);
+        const int counted = interruptions;
+        _exit(std::min(counted, 255));
+    }
+    int status = 0;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    ASSERT_TRUE(WIFEXITED(status)) << status;
+    ASSERT_LT(WEXITSTATUS(status), 255);
+    EXPECT_EQ(session_->end(), 0);
+    ASSERT_TRUE(testing::waitUntil([this] { return completed_.load(); }));
+    EXPECT_EQ(events_.size() + session_->lostEvents(), 1U + static_cast<std::size_t>(WEXITSTATUS(status)));
 }
 
 TEST_F(TraceTest, AProgramInCIsCollected) {

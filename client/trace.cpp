@@ -2,13 +2,16 @@
 // exception leaves it.
 #include "client/include/vela/trace.h"
 
+#include "platform/spoor/SlowPath.h"
 #include "platform/spoor/TraceEmitter.h"
 
 #include <atomic>
+#include <cstdint>
 #include <cstdlib>
 #include <string>
 
 using vela::platform::spoor::emitterFolders;
+using vela::platform::spoor::SlowPath;
 using vela::platform::spoor::TraceEmitter;
 
 namespace {
@@ -24,7 +27,18 @@ std::string traceVariable(const char* name) {
     return value != nullptr ? value : "";
 }
 
-TraceEmitter& emitter() {
+/// Events of handlers of signals that interrupted the emitter's making.
+std::atomic<std::uint64_t> lostBefore = 0;
+
+/// Null for a handler of a signal that interrupts the making on its own thread.
+TraceEmitter* emitter() {
+    if (TraceEmitter* const made = madeEmitter; made != nullptr) {
+        return made;
+    }
+    if (SlowPath::isUnderWay()) {
+        return nullptr;
+    }
+    const SlowPath making;
     static TraceEmitter& made = *[] {
         vela::platform::spoor::EmitterEnvironment environment;
         environment.velaRuntime = traceVariable("VELA_RUNTIME");
@@ -33,7 +47,8 @@ TraceEmitter& emitter() {
         madeEmitter = emitter;
         return emitter;
     }();
-    return made;
+    made.countLost(lostBefore.exchange(0));
+    return &made;
 }
 
 void shareWord(const TraceEmitter& emitter) {
@@ -55,18 +70,24 @@ const uint32_t* VelaReportingTraceActiveWord = &kUnknown;
 
 void VelaReportingTraceEmit(uint32_t code, uint64_t first, uint64_t second, uint64_t third, uint64_t fourth) noexcept
     try {
-    TraceEmitter& own = emitter();
-    static_cast<void>(own.emitNow(code, {first, second, third, fourth}));
-    if (__atomic_load_n(&VelaReportingTraceActiveWord, __ATOMIC_RELAXED) != own.activeWord()) {
-        shareWord(own);
+    TraceEmitter* const own = emitter();
+    if (own == nullptr) {
+        ++lostBefore;
+        return;
+    }
+    static_cast<void>(own->emitNow(code, {first, second, third, fourth}));
+    if (__atomic_load_n(&VelaReportingTraceActiveWord, __ATOMIC_RELAXED) != own->activeWord()) {
+        shareWord(*own);
     }
 } catch (...) {
     // Without memory for the first one there is no event.
 }
 
 void VelaReportingTracePrepareThread() noexcept try {
-    emitter().prepareThread();
-    shareWord(emitter());
+    if (TraceEmitter* const own = emitter(); own != nullptr) {
+        own->prepareThread();
+        shareWord(*own);
+    }
 } catch (...) {
     // The first event tries again.
 }

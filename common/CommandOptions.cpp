@@ -6,6 +6,15 @@
 
 namespace vela {
 
+namespace {
+
+/// No option begins like a negative number.
+bool isOperand(std::string_view argument) {
+    return !argument.starts_with('-') || argument == "-" || (argument[1] >= '0' && argument[1] <= '9');
+}
+
+} // namespace
+
 bool CommandArguments::has(std::string_view name) const {
     return std::ranges::any_of(options, [&](const Option& option) { return option.name == name; });
 }
@@ -30,7 +39,7 @@ platform::Result<CommandArguments> readArguments(std::span<const std::string_vie
                                  arguments.end());
             break;
         }
-        if (!argument.starts_with('-') || argument == "-") {
+        if (isOperand(argument)) {
             read.operands.emplace_back(argument);
             continue;
         }

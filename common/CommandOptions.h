@@ -28,8 +28,8 @@ struct CommandArguments {
     std::vector<std::string> valuesOf(std::string_view name) const;
 };
 
-/// "--name value" and "--name=value"; all behind "--" and a single "-" are operands. Fails with what a person should
-/// know: `there is no option --sett`.
+/// "--name value" and "--name=value"; all behind "--", a single "-" and a negative number ("-17") are operands. Fails
+/// with what a person should know: `there is no option --sett`.
 platform::Result<CommandArguments> readArguments(std::span<const std::string_view> arguments,
                                                  std::span<const CommandOption> known);
 

@@ -51,6 +51,14 @@ TEST(CommandOptionsTest, EverythingBehindTwoDashesIsAnOperand) {
     EXPECT_THAT(arguments->operands, ElementsAre("--json", "--nothing"));
 }
 
+TEST(CommandOptionsTest, ANegativeNumberIsAnOperand) {
+    const auto arguments = read({"-5", "--json", "-0x11", "-1.5"});
+    ASSERT_TRUE(static_cast<bool>(arguments));
+    EXPECT_TRUE(arguments->has("--json"));
+    EXPECT_THAT(arguments->operands, ElementsAre("-5", "-0x11", "-1.5"));
+    EXPECT_EQ(read({"--5"}).failure().description, "there is no option --5");
+}
+
 TEST(CommandOptionsTest, AnUnknownOptionIsRefused) {
     EXPECT_EQ(read({"--sett"}).failure().description, "there is no option --sett");
     EXPECT_EQ(read({"-j"}).failure().description, "there is no option -j");

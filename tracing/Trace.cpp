@@ -18,7 +18,7 @@ void Trace::processTracepoints(const platform::SpoorSession& session, std::span<
     }
 }
 
-TraceResults Trace::getResults() {
+const TraceResults& Trace::getResults() {
     for (const auto& interval : intervals_) {
         if (interval->hasResults()) {
             std::vector<std::uint64_t>& values = results_[interval->name()];
@@ -26,6 +26,14 @@ TraceResults Trace::getResults() {
         }
     }
     return results_;
+}
+
+void Trace::forgetResults() {
+    for (const auto& interval : intervals_) {
+        interval->forgetResults();
+    }
+    results_.clear();
+    timeline_ = TraceTimeline();
 }
 
 } // namespace vela

@@ -29,9 +29,12 @@ public:
     /// `processTracepoints`, in their order.
     void processTracepoints(const platform::SpoorSession& session, std::span<const trace_point> points);
 
-    /// Adds what every interval has to the results and answers a copy of them. It adds again each time it is asked: a
-    /// second answer holds every value twice.
-    TraceResults getResults();
+    /// Adds what every interval has to the results and answers them. It adds again each time it is asked: the second
+    /// time they hold every value twice.
+    const TraceResults& getResults();
+
+    /// Gives the memory of results and timeline back.
+    void forgetResults();
 
     const std::string& name() const { return name_; }
     bool isCritical() const { return critical_; }

@@ -28,6 +28,8 @@ public:
     bool hasResults() const { return !results_.empty(); }
     /// In the order found: an interval's are nanoseconds. A copy.
     std::vector<std::uint64_t> getResults() const { return results_; }
+    /// Gives their memory back. The number of pairs stays.
+    void forgetResults() { std::vector<std::uint64_t>().swap(results_); }
     /// Sum of the results, added in their order as 32-bit floats, over the number of matched pairs: not a number where
     /// there is nothing.
     float getAverageResult() const;

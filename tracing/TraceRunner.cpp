@@ -31,7 +31,9 @@ constexpr std::string_view kLostEventsUnit = "events";
 } // namespace
 
 struct TraceRunner::Run {
-    explicit Run(const TraceParams& params) : trace(params.name, params.type == kTraceTypeSpoor) {
+    Run(const TraceParams& params, const std::shared_ptr<TracePointBudget>& budget)
+        : trace(params.name, params.type == kTraceTypeSpoor),
+          points(budget) {
         for (const auto& point : params.dataParams) {
             trace.addTraceDataToCollect(
                 std::make_unique<TraceInterval>(point->name, point->beginCode, point->endCode, point->matchedByThread));
@@ -42,7 +44,7 @@ struct TraceRunner::Run {
     std::unique_ptr<platform::SpoorSession> session; ///< from the set-up to the completion
     TracePointList points;                           ///< empty again when they were matched
     std::uint64_t lostEvents = 0;                    ///< by the facility, or beyond a limit here
-    std::optional<TraceResults> results;             ///< of a critical trace that was stopped
+    const TraceResults* results = nullptr;           ///< the trace's own, once it is critical and was stopped
 };
 
 TraceRunner::TraceRunner(TraceRunnerPlatform runnerPlatform)
@@ -70,7 +72,7 @@ void TraceRunner::createTraceFromTraceParams(const TraceParams* params) {
         VelaReportingTraceCategory().standard("Attempted to add nullptr to trace runner");
         return;
     }
-    runs_.push_back(std::make_unique<Run>(*params));
+    runs_.push_back(std::make_unique<Run>(*params, platform_.pointBudget));
 }
 
 void TraceRunner::runTraces() {
@@ -144,12 +146,19 @@ void TraceRunner::stopTracingandProcessResults() {
         });
         completion_->wait(std::nullopt);
         if (run->trace.isCritical()) {
-            run->results = run->trace.getResults();
+            run->results = &run->trace.getResults();
         }
         log.info("Completed trace.... %d,   %lu", completedCount_, runs_.size());
     }
     if (writeMetricsheet()) {
         writeTimeline();
+    }
+}
+
+void TraceRunner::forgetResults() {
+    for (const auto& run : runs_) {
+        run->results = nullptr;
+        run->trace.forgetResults();
     }
 }
 
@@ -164,7 +173,7 @@ std::uint64_t TraceRunner::lostEvents() const {
 bool TraceRunner::writeMetricsheet() {
     const LogCategory& log = VelaReportingTraceCategory();
     log.info("Completed trace....In write perf data.... %lu",
-             std::ranges::count_if(runs_, [](const auto& run) { return run->results.has_value(); }));
+             std::ranges::count_if(runs_, [](const auto& run) { return run->results != nullptr; }));
     const std::string folder = resultsFolder();
     if (const auto made = platform_.fileSystem.createDirectories(folder, kFolderPermissions); !made) {
         log.error("can't create logging directory at %@: %@", folder, made.failure().description);
@@ -179,7 +188,7 @@ bool TraceRunner::writeMetricsheet() {
         return false;
     }
     for (const auto& run : runs_) {
-        if (run->results) {
+        if (run->results != nullptr) {
             printTraceResults(run->trace, *run->results);
             for (const auto& [name, values] : *run->results) {
                 for (const std::uint64_t value : values) {

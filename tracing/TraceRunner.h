@@ -12,6 +12,7 @@
 #include "platform/WorkQueue.h"
 #include "tracing/Trace.h"
 #include "tracing/TraceParams.h"
+#include "tracing/TracePointBudget.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -33,6 +34,8 @@ struct TraceRunnerPlatform {
     platform::Spoor& spoor;
     platform::WorkQueues& workQueues;
     std::string pathRoot; ///< what absolute paths stand under; empty for "/"
+    /// Shared by all runners that are made of copies of this.
+    std::shared_ptr<TracePointBudget> pointBudget = std::make_shared<TracePointBudget>();
 };
 
 class TraceRunner {
@@ -51,6 +54,9 @@ public:
     /// Ends every trace, waits without a limit until each is matched, and writes the results. Ends the process where
     /// their file cannot be opened.
     void stopTracingandProcessResults();
+
+    /// Gives the memory of results and pictures back. A further stop writes only what it finds itself.
+    void forgetResults();
 
     std::size_t getNumTraces() const { return runs_.size(); }
     std::int32_t getResultsVersion() const;

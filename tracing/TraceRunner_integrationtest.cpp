@@ -18,6 +18,7 @@
 #include <nlohmann/json.hpp>
 #include <sys/stat.h>
 #include <thread>
+#include <unistd.h>
 
 namespace vela {
 
@@ -116,6 +117,25 @@ TEST_F(TraceRunnerOnLinuxTest, AFileInTheFoldersPlaceIsLoggedAndEndsTheProcess) 
     EXPECT_THAT(log.lines(), Contains(traceLine(LogLevel::Error, "TraceRunner",
                                                 "can't create logging directory at " + folder_ + ": create folder " +
                                                     folder_ + ": Not a directory")));
+    EXPECT_EQ(log.lines().back(), traceLine(LogLevel::Info, "TraceRunner", "Failed to open metricsheet writer"));
+    EXPECT_THAT(process_.statuses(), ElementsAre(1));
+}
+
+// Everybody may rename the folder and put a link in its place.
+TEST_F(TraceRunnerOnLinuxTest, AnotherUsersLinkInTheFoldersPlaceIsNotFollowed) {
+    constexpr uid_t kStranger = 4001;
+    std::filesystem::create_directories(root_ / "precious");
+    std::filesystem::create_directories(std::filesystem::path(folder_).parent_path());
+    std::filesystem::create_directory_symlink(root_ / "precious", folder_);
+    if (lchown(folder_.c_str(), kStranger, kStranger) != 0) {
+        GTEST_SKIP() << "gives a link to another user, which takes root";
+    }
+    testing::CapturingLog log;
+    run(process_);
+    EXPECT_TRUE(std::filesystem::is_empty(root_ / "precious"));
+    EXPECT_THAT(log.lines(), Contains(traceLine(LogLevel::Error, "TraceRunner",
+                                                "can't create logging directory at " + folder_ + ": create folder " +
+                                                    folder_ + ": a link of user 4001 is not followed")));
     EXPECT_EQ(log.lines().back(), traceLine(LogLevel::Info, "TraceRunner", "Failed to open metricsheet writer"));
     EXPECT_THAT(process_.statuses(), ElementsAre(1));
 }

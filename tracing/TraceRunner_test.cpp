@@ -4,6 +4,7 @@
 #include "testing/FakeProcessControl.h"
 #include "testing/ManualClock.h"
 #include "testing/ManualWorkQueues.h"
+#include "tracing/TracePointBudget.h"
 #include "tracing/TracePointList.h"
 #include "tracing/TraceRunner.h"
 #include "tracing/Trace_test.h"
@@ -503,17 +504,106 @@ TEST_F(TraceRunnerTest, LostEventsOfAllTracesAreOneLine) {
     EXPECT_THAT(written(), ElementsAre(FakeMetricsheet::Value{"lost events", 4, "events"}));
 }
 
-TEST(TracePointListTest, EventsBeyondItsRoomAreCounted) {
-    TracePointList list(2);
-    for (std::uint64_t time = 1; time <= 5; ++time) {
-        list.add(eventAt(time, kBegin));
+TEST_F(TraceRunnerTest, EventsBeyondWhatAllRunnersMayKeepAreLostAndCounted) {
+    const TraceRunnerPlatform shared{
+        files_, metricsheet_, process_, spoor_, queues_, "", std::make_shared<TracePointBudget>(5)};
+    runner_ = std::make_unique<TraceRunner>(shared);
+    createOne();
+    runner().runTraces();
+    TraceRunner second(shared);
+    TraceParams params = makeParams("second");
+    addPoint(params, "open", kBegin, kEnd);
+    second.createTraceFromTraceParams(&params);
+    replay({eventAt(1, kBegin), eventAt(4, kEnd), eventAt(5, kBegin), eventAt(9, kEnd)});
+    second.runTraces();
+    replay({eventAt(10, kBegin), eventAt(20, kEnd)});
+    stop();
+    // The first runner took all that there was.
+    EXPECT_THAT(written(), ElementsAre(nanoseconds("open", 3), nanoseconds("open", 4),
+                                       FakeMetricsheet::Value{"lost events", 1, "events"}));
+    replay({eventAt(30, kBegin), eventAt(40, kEnd)});
+    second.stopTracingandProcessResults();
+    EXPECT_THAT(written(), ElementsAre(nanoseconds("open", 10), FakeMetricsheet::Value{"lost events", 2, "events"}));
+}
+
+TEST_F(TraceRunnerTest, ForgottenResultsAreNotWrittenAgain) {
+    createOne();
+    runner().runTraces();
+    replay({eventAt(1, kBegin), eventAt(4, kEnd)});
+    stop();
+    EXPECT_THAT(written(), ElementsAre(nanoseconds("open", 3)));
+    EXPECT_EQ(timeline()["traceEvents"].size(), 1U);
+    runner().forgetResults();
+    stop();
+    EXPECT_THAT(written(), IsEmpty());
+    EXPECT_EQ(timeline()["traceEvents"].size(), 0U);
+}
+
+class TracePointListTest : public ::testing::Test {
+protected:
+    static void add(TracePointList& list, std::uint64_t count) {
+        for (std::uint64_t time = 1; time <= count; ++time) {
+            list.add(eventAt(time, kBegin));
+        }
     }
+
+    const std::shared_ptr<TracePointBudget> budget_ = std::make_shared<TracePointBudget>(20'000);
+};
+
+TEST_F(TracePointListTest, ThereIsMemoryForTenThousandEventsAtOnce) {
+    const TracePointList list(budget_);
+    EXPECT_EQ(list.capacity(), 10'000U);
+    EXPECT_EQ(budget_->take(30'000), 20'000U) << "nothing is kept yet";
+}
+
+TEST_F(TracePointListTest, EventsBeyondItsRoomAreCounted) {
+    TracePointList list(budget_, 2);
+    add(list, 5);
     ASSERT_EQ(list.points().size(), 2U);
     EXPECT_EQ(list.points()[1].timestamp, 2U);
     EXPECT_EQ(list.lost(), 3U);
     list.clear();
     EXPECT_EQ(list.points().size(), 0U);
     EXPECT_EQ(list.lost(), 3U);
+}
+
+TEST_F(TracePointListTest, ItsMemoryIsThatOfItsRoomAtMost) {
+    TracePointList list(budget_, 12'345);
+    add(list, 12'345);
+    EXPECT_EQ(list.points().size(), 12'345U);
+    EXPECT_EQ(list.capacity(), 12'345U);
+}
+
+TEST_F(TracePointListTest, ListsShareWhatTheyMayKeep) {
+    TracePointList first(budget_);
+    TracePointList second(budget_);
+    add(first, 15'000);
+    add(second, 15'000);
+    EXPECT_EQ(first.points().size(), 15'000U);
+    EXPECT_EQ(first.lost(), 0U);
+    // The first one took 15 times 1,024.
+    EXPECT_EQ(second.points().size(), 4'640U);
+    EXPECT_EQ(second.lost(), 10'360U);
+    first.clear();
+    add(second, 10);
+    EXPECT_EQ(second.points().size(), 4'650U);
+    EXPECT_EQ(second.lost(), 10'360U);
+}
+
+TEST_F(TracePointListTest, AListThatGoesGivesItsPartBack) {
+    {
+        TracePointList list(budget_);
+        add(list, 20'000);
+        EXPECT_EQ(list.points().size(), 20'000U);
+        EXPECT_EQ(budget_->take(1), 0U);
+    }
+    EXPECT_EQ(budget_->take(30'000), 20'000U);
+}
+
+TEST_F(TracePointListTest, AServiceKeepsEightMillionEventsAndATraceHalfOfThem) {
+    EXPECT_EQ(TracePointBudget().take(10'000'000), 8'388'608U);
+    EXPECT_EQ(TracePointList::kMostPoints, 4'194'304U);
+    EXPECT_EQ(sizeof(trace_point), 72U);
 }
 
 // The picture.

@@ -82,6 +82,7 @@ struct LocalConnection final : platform::IpcConnection {
     std::shared_ptr<platform::ReportingServiceProtocol> exported;
 
     std::int32_t processIdentifier() const override { return getpid(); }
+    bool confirmProcess() const override { return true; }
     std::optional<platform::Identity> peerIdentity() const override { return std::nullopt; }
     void setExportedObject(std::shared_ptr<platform::ReportingServiceProtocol> object) override {
         exported = std::move(object);

@@ -1,10 +1,9 @@
 // How connections come to be: accepted, refused, or left waiting while no descriptor is left.
 #include "platform/dbus/ServiceEndpoint.h"
+#include "platform/linux/DescriptorLimit.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdint>
-#include <sys/resource.h>
 #include <sys/socket.h>
 #include <utility>
 
@@ -21,14 +20,7 @@ constexpr std::uint32_t kLingeringRefusals = 32;
 constexpr auto kWithoutDescriptors = 500ms;
 
 /// What the service itself needs: files that sessions write, the store's, processes to ask for their name.
-constexpr rlim_t kOwnDescriptors = 64;
-
-/// The number from which on descriptors are the service's own.
-std::uint64_t descriptorsForClients() {
-    rlimit limit{};
-    getrlimit(RLIMIT_NOFILE, &limit);
-    return limit.rlim_cur - std::min(kOwnDescriptors, limit.rlim_cur / 2);
-}
+constexpr std::uint64_t kOwnDescriptors = 64;
 
 bool isLackOfResources(int error) { return error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM; }
 
@@ -80,7 +72,7 @@ void DbusServiceEndpoint::admit(FileDescriptor socket) {
         return;
     }
     // The system gives the lowest free number.
-    const bool isLate = static_cast<std::uint64_t>(socket.get()) >= descriptorsForClients();
+    const bool isLate = static_cast<std::uint64_t>(socket.get()) >= descriptorsForClients(kOwnDescriptors);
     std::string refusal = isLate ? "too-many-open-files" : refusalOf(*peer);
     if (!refusal.empty()) {
         ++refused_;

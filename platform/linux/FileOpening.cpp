@@ -1,5 +1,7 @@
 #include "platform/linux/FileOpening.h"
 
+#include "platform/Mutex.h"
+
 #include <array>
 #include <cerrno>
 #include <climits>
@@ -9,6 +11,7 @@
 #include <optional>
 #include <string_view>
 #include <sys/fsuid.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/xattr.h>
@@ -208,9 +211,47 @@ int become(const Identity& reader) {
     return syscall(SYS_capset, &header, none.data()) == 0 ? 0 : errno;
 }
 
+/// While one of these lives, threads of this process take other users. That makes the kernel regard the whole process
+/// as one that nobody may look into: no core dumps, no debugger. It does not give this back when the threads end, so it
+/// is done here, when the last one has.
+class DumpableScope {
+public:
+    DumpableScope() {
+        const MutexLock lock(state_.mutex);
+        if (state_.users++ == 0) {
+            state_.wasDumpable = prctl(PR_GET_DUMPABLE) == kDumpable;
+        }
+    }
+    ~DumpableScope() {
+        const MutexLock lock(state_.mutex);
+        if (--state_.users == 0 && state_.wasDumpable) {
+            prctl(PR_SET_DUMPABLE, kDumpable);
+        }
+    }
+    DumpableScope(const DumpableScope&) = delete;
+    DumpableScope& operator=(const DumpableScope&) = delete;
+
+private:
+    static constexpr int kDumpable = 1;
+
+    struct State {
+        Mutex mutex;
+        int users VELA_GUARDED_BY(mutex) = 0;
+        bool wasDumpable VELA_GUARDED_BY(mutex) = false;
+    };
+    // The attribute is the process's, so there is one state of it, never destroyed.
+    static State& state() {
+        static auto* const state = new State();
+        return *state;
+    }
+
+    State& state_ = state();
+};
+
 /// On a thread that ends with the rights it took.
 Result<FileDescriptor> openAs(const Identity& reader, const std::string& path) {
     std::optional<Result<FileDescriptor>> opened;
+    const DumpableScope scope;
     try {
         std::thread([&] {
             const int error = become(reader);

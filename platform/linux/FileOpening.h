@@ -1,7 +1,8 @@
 // Opens files that somebody else named, with that one's rights. Thread-safe and without state.
 //
 // A service that may change its user (CAP_SETUID and CAP_SETGID) lets the kernel decide: it goes to the file on a
-// thread of its own that has the reader's user and groups for file systems and no capability, and ends with it.
+// thread of its own that has the reader's user and groups for file systems and no capability, and ends with it. That
+// thread makes the kernel forbid the process's core dumps; they are allowed again afterwards if they were before.
 //
 // Any other service decides by itself, from what it may open: of every folder on the way the reader needs the right to
 // search, of the file the right to read. As in the kernel the first that fits counts: the owner's three bits for the

@@ -13,6 +13,7 @@
 #include <string>
 #include <string_view>
 #include <sys/fsuid.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/xattr.h>
 #include <thread>
@@ -206,6 +207,27 @@ TEST_P(FileOpeningTest, TheCallersOwnRightsStayAsTheyAre) {
     EXPECT_EQ(linux_.readFile(folder_ / "a", 100).operator*(), "text");
     write("own", "secret", 0600);
     EXPECT_EQ(*linux_.readFile(folder_ / "own", 100), "secret");
+}
+
+TEST_P(FileOpeningTest, TheProcessMayDumpItsCoreAsBefore) {
+    write("a", "text");
+    ASSERT_EQ(prctl(PR_SET_DUMPABLE, 1), 0);
+    std::vector<std::thread> threads;
+    for (int i = 0; i < 4; ++i) {
+        threads.emplace_back([this] {
+            for (int round = 0; round < 20; ++round) {
+                EXPECT_EQ(read("a"), "text");
+            }
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    EXPECT_EQ(prctl(PR_GET_DUMPABLE), 1);
+    ASSERT_EQ(prctl(PR_SET_DUMPABLE, 0), 0);
+    EXPECT_EQ(read("a"), "text");
+    EXPECT_EQ(prctl(PR_GET_DUMPABLE), 0) << "who forbade it finds it forbidden";
+    prctl(PR_SET_DUMPABLE, 1);
 }
 
 TEST_P(FileOpeningTest, ManyThreadsReadForDifferentUsers) {

@@ -2,6 +2,7 @@
 
 #include "platform/linux/FileDescriptor.h"
 #include "platform/linux/FileOpening.h"
+#include "platform/linux/FolderWalk.h"
 
 #include <array>
 #include <cerrno>
@@ -66,7 +67,12 @@ public:
             return;
         }
         name_ = name;
-        folder_ = FileDescriptor(open(folderPath.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+        const Result<FileDescriptor> found = openFolder(folderPath);
+        if (!found) {
+            failure_ = found.failure();
+            return;
+        }
+        folder_ = openForListing(*found);
         if (!folder_) {
             failure_ = failureOf("open folder", folderPath, errno);
             return;
@@ -159,25 +165,6 @@ private:
     bool renamed_ = false;
 };
 
-Result<Done> createDirectory(const std::string& path, std::uint32_t permissions) {
-    if (mkdir(path.c_str(), S_IRWXU) == 0) {
-        // The umask may have taken bits away. A link that somebody put in the new folder's place is not followed.
-        if (fchmodat(AT_FDCWD, path.c_str(), permissions & kPermissionBits, AT_SYMLINK_NOFOLLOW) != 0) {
-            return failureOf("set permissions of", path, errno);
-        }
-        return Done();
-    }
-    const int error = errno;
-    struct stat status {};
-    if (stat(path.c_str(), &status) != 0) {
-        return failureOf("create folder", path, error);
-    }
-    if (!S_ISDIR(status.st_mode)) {
-        return failureOf("create folder", path, ENOTDIR);
-    }
-    return Done();
-}
-
 /// All of `file`, which stands at `path`; none is open where that failed with an error number.
 Result<std::string> contentOf(const FileDescriptor& file, const std::string& path, std::size_t limit) {
     struct stat status {};
@@ -222,12 +209,8 @@ Result<Done> LinuxFileSystem::createDirectories(const std::string& path, std::ui
     if (!isPath(path)) {
         return failureOf("create folder", path, EINVAL);
     }
-    for (std::size_t end = path.find('/', 1);; end = path.find('/', end + 1)) {
-        Result<Done> created = createDirectory(path.substr(0, end), permissions);
-        if (!created || end == std::string::npos) {
-            return created;
-        }
-    }
+    const Result<FileDescriptor> made = makeFolders(path, permissions);
+    return made ? Result<Done>(Done()) : made.failure();
 }
 
 std::string LinuxFileSystem::currentDirectory() const {

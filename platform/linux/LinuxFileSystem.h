@@ -1,4 +1,5 @@
-// Files and folders of the operating system. Without state, so thread-safe.
+// Files and folders of the operating system. Without state, so thread-safe. Folders that files are written or made in
+// are found by platform/linux/FolderWalk.h, which says whose links are followed.
 #pragma once
 
 #include "platform/FileSystem.h"

@@ -34,6 +34,15 @@ protected:
         EXPECT_THAT(errorTexts(), ElementsAre(text));
         expectNothingLeft();
     }
+    /// The file that a running trace has until its end.
+    std::string startTraceAndAnswerItsFile() {
+        makeSession(FakePerfScript());
+        session_->startProbeTrace();
+        EXPECT_TRUE(waitForCall("start"));
+        const std::vector<std::string> names = namesIn(results());
+        EXPECT_THAT(names, ElementsAre(MatchesRegex("probe-000001-.*\\.data\\.part")));
+        return results() + "/" + (names.empty() ? "none" : names.front());
+    }
     void expectNothingLeft() const {
         EXPECT_THAT(delegate_->urls(), ElementsAre(""));
         EXPECT_THAT(namesIn(results()), IsEmpty());
@@ -188,10 +197,36 @@ TEST_F(PerfProbeFailuresTest, PerfWritesNothing) {
 }
 
 TEST_F(PerfProbeFailuresTest, PerfRemovesItsResult) {
-    trace({.stop = "rm \"$path\"; exit 0"});
+    trace({.stop = "rm \"$(readlink /proc/$$/fd/5)\"; exit 0"});
     EXPECT_THAT(delegate_->calls(), ElementsAre("start", "stop", "complete failed"));
     EXPECT_THAT(errorTexts(), ElementsAre(MatchesRegex("result of the trace, .*\\.part: No such file or directory")));
     expectNothingLeft();
+}
+
+// Others may write into the folder.
+TEST_F(PerfProbeFailuresTest, AFilePutInTheResultsPlaceIsNeitherWrittenNorPublished) {
+    const std::string part = startTraceAndAnswerItsFile();
+    std::filesystem::remove(part);
+    std::ofstream(part) << "theirs";
+    session_->stopProbeTrace();
+    ASSERT_TRUE(waitForCompletions(1));
+    EXPECT_THAT(delegate_->calls(), ElementsAre("start", "stop", "complete failed"));
+    EXPECT_THAT(errorTexts(), ElementsAre("result of the trace, " + part + ": something else has taken its place"));
+    EXPECT_EQ(contentOf(part), "theirs");
+    EXPECT_EQ(namesIn(results()).size(), 1U);
+}
+
+TEST_F(PerfProbeFailuresTest, ALinkPutInTheResultsPlaceIsNotFollowed) {
+    const std::string part = startTraceAndAnswerItsFile();
+    std::filesystem::remove(part);
+    std::filesystem::create_symlink(folder_ / "target", part);
+    session_->stopProbeTrace();
+    ASSERT_TRUE(waitForCompletions(1));
+    EXPECT_THAT(delegate_->calls(), ElementsAre("start", "stop", "complete failed"));
+    EXPECT_THAT(errorTexts(), ElementsAre("result of the trace, " + part + ": something else has taken its place"));
+    EXPECT_FALSE(std::filesystem::exists(folder_ / "target"));
+    EXPECT_TRUE(std::filesystem::is_symlink(part));
+    EXPECT_EQ(namesIn(results()).size(), 1U);
 }
 
 TEST_F(PerfProbeFailuresTest, WhatPerfStartedEndsWithIt) {

@@ -9,9 +9,11 @@
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <memory>
 #include <optional>
 #include <thread>
 #include <unistd.h>
+#include <vector>
 
 namespace vela::platform::perf {
 
@@ -60,8 +62,7 @@ TEST_F(PerfProbeTest, PerfProfilesTheWholeSystem) {
     trace(FakePerfScript());
     EXPECT_THAT(contentOf(program() + ".arguments"),
                 MatchesRegex("record\n-a\n-e\ncpu-clock\n-F\n999\n-g\n-k\nCLOCK_MONOTONIC\n--delay=-1\n--no-bpf-event\n"
-                             "--no-buildid-cache\n--max-size=67108864B\n--control=fd:3,4\n-o\n" +
-                             results() + "/probe-000001-[0-9]*T[0-9]*Z\\.data\\.part\n"));
+                             "--no-buildid-cache\n--max-size=67108864B\n--control=fd:3,4\n-o\n/proc/self/fd/5\n"));
 }
 
 TEST_F(PerfProbeTest, TheResultIsWhatPerfWroteAndOnlyTheServiceMayReadIt) {
@@ -164,6 +165,53 @@ TEST_F(PerfProbeTest, SessionsTraceBesideEachOther) {
                 ElementsAre(MatchesRegex("probe-000001-.*\\.data"), MatchesRegex("probe-000002-.*\\.data")));
 }
 
+TEST_F(PerfProbeTest, FourTracesRunAtTheSameTimeAndAFifthDoesNotStart) {
+    writeFakePerf(program(), {});
+    PerfProbe probe(options_, clock_, queues_.background());
+    std::vector<std::shared_ptr<ProbeTraceSession>> sessions;
+    for (int i = 0; i < 4; ++i) {
+        sessions.push_back(probe.createProbeTraceSession(*probe.makeProbeTraceConfig(1)));
+        sessions.back()->setDelegate(delegate_);
+        sessions.back()->startProbeTrace();
+    }
+    ASSERT_TRUE(testing::waitUntil([&] { return delegate_->calls().size() == 4; }));
+    EXPECT_THAT(delegate_->calls(), ElementsAre("start", "start", "start", "start"));
+
+    const auto fifth = probe.createProbeTraceSession(*probe.makeProbeTraceConfig(1));
+    const auto told = std::make_shared<testing::RecordingProbeDelegate>();
+    fifth->setDelegate(told);
+    fifth->startProbeTrace();
+    ASSERT_TRUE(testing::waitUntil([&] { return told->completions() == 1; }));
+    EXPECT_THAT(told->calls(), ElementsAre("start failed", "complete failed"));
+    for (const Failure& failure : told->failures()) {
+        EXPECT_EQ(failure.description, "4 performance traces run already, the limit is 4");
+        EXPECT_EQ(failure.code, EBUSY);
+    }
+    EXPECT_EQ(namesIn(results()).size(), 4U);
+
+    sessions.front()->stopProbeTrace();
+    ASSERT_TRUE(waitForCompletions(1));
+    fifth->startProbeTrace();
+    fifth->stopProbeTrace();
+    ASSERT_TRUE(testing::waitUntil([&] { return told->completions() == 2; }));
+    EXPECT_THAT(told->calls(), ElementsAre("start failed", "complete failed", "start", "stop", "complete"));
+    sessions.clear();
+    ASSERT_TRUE(waitForCompletions(4));
+}
+
+TEST_F(PerfProbeTest, ATraceThatFailsGivesItsPlaceBack) {
+    options_.mostTraces = 1;
+    options_.program = folder_ / "none";
+    makeSession();
+    for (std::ptrdiff_t traces = 1; traces <= 3; ++traces) {
+        session_->startProbeTrace();
+        ASSERT_TRUE(waitForCompletions(traces));
+    }
+    for (const Failure& failure : delegate_->failures()) {
+        EXPECT_EQ(failure.description, "cannot run " + (folder_ / "none") + ": No such file or directory");
+    }
+}
+
 TEST_F(PerfProbeTest, TheNewestResultsAreKept) {
     options_.mostFiles = 2;
     makeSession(FakePerfScript());
@@ -195,8 +243,8 @@ TEST_F(PerfProbeTest, PerfInheritsNoDescriptorAndNoEnvironment) {
     trace({.stop = "{ ls /proc/self/fd | tr '\\n' ' '; echo $HOME; } >\"$path\"; exit 0"});
     close(kNumber);
     ASSERT_EQ(namesIn(results()).size(), 1U);
-    // The fifth is the folder that ls lists.
-    EXPECT_EQ(contentOf(results() + "/" + namesIn(results())[0]), "0 1 2 3 4 5 /\n");
+    // The sixth is the folder that ls lists.
+    EXPECT_EQ(contentOf(results() + "/" + namesIn(results())[0]), "0 1 2 3 4 5 6 /\n");
 }
 
 TEST_F(PerfProbeTest, PerfHandlesItsSignalsAsIfTheServiceDidNot) {

@@ -81,7 +81,7 @@ bool isChatter(std::string_view line) {
 /// What the new process needs to become the program. All of it is made before the fork: from there to the exec there
 /// are only calls that a signal handler might make.
 struct PerfProcess::Child {
-    std::array<int, 5> ends; ///< by the number that each shall have in the program
+    std::array<int, 6> ends; ///< by the number that each shall have in the program
     int report;
     pid_t parent;
     const char* program;
@@ -119,7 +119,7 @@ private:
                 return false;
             }
         }
-        close_range(kAnswers + 1, std::numeric_limits<unsigned>::max(), CLOSE_RANGE_CLOEXEC);
+        close_range(kResult + 1, std::numeric_limits<unsigned>::max(), CLOSE_RANGE_CLOEXEC);
         resetSignals();
         return true;
     }
@@ -151,7 +151,8 @@ PerfProcess::~PerfProcess() {
     }
 }
 
-Result<Done> PerfProcess::start(const std::string& program, const std::vector<std::string>& arguments) {
+Result<Done> PerfProcess::start(const std::string& program, const std::vector<std::string>& arguments,
+                                const FileDescriptor& result) {
     program_ = program;
     Pipe commands;
     Pipe answers;
@@ -172,7 +173,7 @@ Result<Done> PerfProcess::start(const std::string& program, const std::vector<st
         environment.push_back(const_cast<char*>(variable));
     }
     environment.push_back(nullptr);
-    Child child{{nothing.get(), nothing.get(), errors.in.get(), commands.out.get(), answers.in.get()},
+    Child child{{nothing.get(), nothing.get(), errors.in.get(), commands.out.get(), answers.in.get(), result.get()},
                 report.in.get(),
                 getpid(),
                 program_.c_str(),

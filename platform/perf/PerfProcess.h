@@ -21,9 +21,10 @@ namespace vela::platform::perf {
 
 class PerfProcess {
 public:
-    /// The program's own numbers of the descriptors it is controlled by.
+    /// The program's own numbers of the descriptors it is controlled by, and of the one that it writes its result to.
     static constexpr int kCommands = 3;
     static constexpr int kAnswers = 4;
+    static constexpr int kResult = 5;
     static constexpr std::size_t kMostErrorBytes = 4096;
 
     enum class Event : std::uint8_t { Answer, Ended, Woken, TimedOut };
@@ -34,8 +35,9 @@ public:
     PerfProcess(const PerfProcess&) = delete;
     PerfProcess& operator=(const PerfProcess&) = delete;
 
-    /// Once. That `program` (an absolute path) cannot be run shows as its end.
-    Result<Done> start(const std::string& program, const std::vector<std::string>& arguments);
+    /// Once. That `program` (an absolute path) cannot be run shows as its end. `result`: an open file.
+    Result<Done> start(const std::string& program, const std::vector<std::string>& arguments,
+                       const FileDescriptor& result);
 
     /// Forgets earlier answers. A program that has ended is not told.
     void send(std::string_view command);

@@ -25,7 +25,7 @@ Failure withoutAnswer(const PerfProcess& perf, const std::string& what, std::chr
     return {ETIMEDOUT, what + " within " + std::to_string(limit.count()) + " ms" + (why.empty() ? "" : ": " + why)};
 }
 
-std::vector<std::string> argumentsFor(const PerfProbe::Options& options, const std::string& path) {
+std::vector<std::string> argumentsFor(const PerfProbe::Options& options) {
     return {"record", "-a", "-e", "cpu-clock", "-F", "999", "-g", "-k", "CLOCK_MONOTONIC",
             "--delay=-1", // counts from the first "enable" on
             // Synthesizing these makes the end several times slower, and a trace of programs needs none.
@@ -33,13 +33,16 @@ std::vector<std::string> argumentsFor(const PerfProbe::Options& options, const s
             "--no-buildid-cache", // writes nothing but its result
             "--max-size=" + std::to_string(options.mostBytes) + "B",
             "--control=fd:" + std::to_string(PerfProcess::kCommands) + "," + std::to_string(PerfProcess::kAnswers),
-            "-o", path};
+            // Not by its name, in whose place somebody else's file may stand.
+            "-o", "/proc/self/fd/" + std::to_string(PerfProcess::kResult)};
 }
 
 } // namespace
 
-PerfTraceSession::PerfTraceSession(const PerfProbe::Options& options, const Clock& clock, WorkQueue& queue)
+PerfTraceSession::PerfTraceSession(const PerfProbe::Options& options, std::shared_ptr<TracePlaces> places,
+                                   const Clock& clock, WorkQueue& queue)
     : options_(options),
+      places_(std::move(places)),
       files_(options.folder, options.mostFiles, clock),
       calls_(std::make_shared<DelegateCalls>(queue)),
       wakeUp_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
@@ -66,7 +69,7 @@ void PerfTraceSession::startProbeTrace() {
         if (isTracing_) {
             return;
         }
-        failure = makeThread();
+        failure = takePlace();
         isTracing_ = isStartWanted_ = !failure;
         isStopWanted_ = false;
         // Under the mutex: behind it the trace may fail, and whoever is told may let go of this.
@@ -85,6 +88,18 @@ void PerfTraceSession::stopProbeTrace() {
         isStopWanted_ = true;
         wake();
     }
+}
+
+PerfTraceSession::MaybeFailure PerfTraceSession::takePlace() {
+    if (!places_->take()) {
+        const std::string limit = std::to_string(places_->limit());
+        return Failure{EBUSY, limit + " performance traces run already, the limit is " + limit};
+    }
+    MaybeFailure failure = makeThread();
+    if (failure) {
+        places_->giveBack();
+    }
+    return failure;
 }
 
 PerfTraceSession::MaybeFailure PerfTraceSession::makeThread() {
@@ -168,7 +183,7 @@ PerfTraceSession::MaybeFailure PerfTraceSession::begin(PerfProcess& perf, const 
     if (isAbandoned()) {
         return abandoned();
     }
-    if (Result<Done> started = perf.start(options_.program, argumentsFor(options_, file.partPath())); !started) {
+    if (Result<Done> started = perf.start(options_.program, argumentsFor(options_), file.held()); !started) {
         return started.failure();
     }
     return ask(perf, "enable", options_.startLimit);
@@ -234,6 +249,7 @@ void PerfTraceSession::complete(const std::string& url, MaybeFailure failure) {
     {
         const MutexLock lock(mutex_);
         isTracing_ = false;
+        places_->giveBack();
     }
     calls_->didComplete(url, std::move(failure));
 }

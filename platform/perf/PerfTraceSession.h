@@ -14,6 +14,7 @@
 #include "platform/perf/PerfProbe.h"
 #include "platform/perf/PerfProcess.h"
 #include "platform/perf/TraceFiles.h"
+#include "platform/perf/TracePlaces.h"
 
 #include <chrono>
 #include <memory>
@@ -27,7 +28,8 @@ namespace vela::platform::perf {
 class PerfTraceSession final : public ProbeTraceSession {
 public:
     /// `queue` and `clock` outlive the session.
-    PerfTraceSession(const PerfProbe::Options& options, const Clock& clock, WorkQueue& queue);
+    PerfTraceSession(const PerfProbe::Options& options, std::shared_ptr<TracePlaces> places, const Clock& clock,
+                     WorkQueue& queue);
     ~PerfTraceSession() override;
     PerfTraceSession(const PerfTraceSession&) = delete;
     PerfTraceSession& operator=(const PerfTraceSession&) = delete;
@@ -41,6 +43,7 @@ private:
     using Limit = std::chrono::milliseconds;
 
     // For the callers' threads.
+    MaybeFailure takePlace() VELA_REQUIRES(mutex_);
     MaybeFailure makeThread() VELA_REQUIRES(mutex_);
     void wake() const;
 
@@ -58,6 +61,7 @@ private:
     bool isAbandoned();
 
     const PerfProbe::Options options_;
+    const std::shared_ptr<TracePlaces> places_; ///< one of them is this session's while it traces
     const TraceFiles files_;
     const std::shared_ptr<DelegateCalls> calls_;
     const FileDescriptor wakeUp_;

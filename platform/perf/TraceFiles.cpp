@@ -1,19 +1,22 @@
 #include "platform/perf/TraceFiles.h"
 
-#include "platform/linux/LinuxFileSystem.h"
+#include "platform/linux/FolderWalk.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
 #include <chrono>
 #include <ctime>
+#include <dirent.h>
 #include <fcntl.h>
 #include <filesystem>
+#include <memory>
 #include <optional>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <system_error>
 #include <tuple>
+#include <unistd.h>
 #include <utility>
 #include <vector>
 
@@ -48,6 +51,9 @@ std::string numberText(std::uint32_t number) {
     return digits.size() < kDigits ? std::string(kDigits - digits.size(), '0') + digits : digits;
 }
 
+/// The last part of a path.
+std::string nameIn(const std::string& path) { return path.substr(path.rfind('/') + 1); }
+
 /// The number in a name "probe-<number>-...<suffix>".
 std::optional<std::uint32_t> numberIn(std::string_view name, std::string_view suffix) {
     constexpr std::size_t kMostDigits = 9;
@@ -66,37 +72,54 @@ std::optional<std::uint32_t> numberIn(std::string_view name, std::string_view su
 
 struct Numbered {
     std::uint32_t number;
-    std::string path;
+    std::string name;
 };
 
-std::vector<Numbered> filesWith(const std::string& folder, std::string_view suffix) {
+std::vector<Numbered> filesWith(const FileDescriptor& folder, std::string_view suffix) {
     std::vector<Numbered> files;
-    std::error_code error;
-    for (std::filesystem::directory_iterator file(folder, error), end; !error && file != end; file.increment(error)) {
-        if (const auto number = numberIn(file->path().filename().string(), suffix)) {
-            files.push_back({*number, file->path().string()});
+    FileDescriptor listed = openForListing(folder);
+    const std::unique_ptr<DIR, int (*)(DIR*)> stream(listed ? fdopendir(listed.get()) : nullptr, &closedir);
+    if (stream == nullptr) {
+        return files;
+    }
+    listed.release();
+    // A stream of its own: nobody else reads it meanwhile.
+    while (const dirent* const entry = readdir(stream.get())) { // NOLINT(concurrency-mt-unsafe)
+        std::string name(&entry->d_name[0]);
+        if (const auto number = numberIn(name, suffix)) {
+            files.push_back({*number, std::move(name)});
         }
     }
     std::ranges::sort(files, [](const Numbered& one, const Numbered& other) {
-        return std::tie(one.number, one.path) < std::tie(other.number, other.path);
+        return std::tie(one.number, one.name) < std::tie(other.number, other.name);
     });
     return files;
 }
 
+std::uint32_t highestNumber(const FileDescriptor& folder) {
+    std::uint32_t highest = 0;
+    for (const std::string_view suffix : {kSuffix, kPartSuffix}) {
+        const std::vector<Numbered> files = filesWith(folder, suffix);
+        highest = std::max(highest, files.empty() ? 0 : files.back().number);
+    }
+    return highest;
+}
+
 bool lock(const FileDescriptor& file) { return flock(file.get(), LOCK_EX | LOCK_NB) == 0; }
 
-void removeWhenFree(const std::string& path) {
-    const FileDescriptor file(open(path.c_str(), O_RDWR | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY));
+void removeWhenFree(const FileDescriptor& folder, const std::string& name) {
+    const FileDescriptor file(
+        openat(folder.get(), name.c_str(), O_RDWR | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY));
     if (file && lock(file)) {
-        unlink(path.c_str());
+        unlinkat(folder.get(), name.c_str(), 0);
     }
 }
 
 } // namespace
 
 TraceFile::~TraceFile() {
-    if (held_) {
-        unlink(partPath().c_str());
+    if (held_ && checkPlace() == 0) {
+        unlinkat(folder_.get(), partName().c_str(), 0);
     }
 }
 
@@ -104,15 +127,31 @@ std::string TraceFile::partPath() const {
     return path_.substr(0, path_.size() - kSuffix.size()) + std::string(kPartSuffix);
 }
 
+std::string TraceFile::partName() const { return nameIn(partPath()); }
+
+int TraceFile::checkPlace() const {
+    struct stat held {};
+    struct stat named {};
+    if (fstat(held_.get(), &held) != 0 ||
+        fstatat(folder_.get(), partName().c_str(), &named, AT_SYMLINK_NOFOLLOW) != 0) {
+        return errno;
+    }
+    return held.st_dev == named.st_dev && held.st_ino == named.st_ino ? 0 : ESTALE;
+}
+
 Result<std::string> TraceFile::publish() {
+    const int misplaced = checkPlace();
+    if (misplaced == ESTALE) {
+        return Failure{ESTALE, "result of the trace, " + partPath() + ": something else has taken its place"};
+    }
     struct stat written {};
-    if (stat(partPath().c_str(), &written) != 0) {
-        return failureOf("result of the trace, " + partPath(), errno);
+    if (misplaced != 0 || fstat(held_.get(), &written) != 0) {
+        return failureOf("result of the trace, " + partPath(), misplaced != 0 ? misplaced : errno);
     }
     if (written.st_size == 0) {
         return Failure{ENODATA, "result of the trace, " + partPath() + ": nothing was written"};
     }
-    if (rename(partPath().c_str(), path_.c_str()) != 0) {
+    if (renameat(folder_.get(), partName().c_str(), folder_.get(), nameIn(path_).c_str()) != 0) {
         return failureOf("result of the trace, " + path_, errno);
     }
     held_ = FileDescriptor();
@@ -129,23 +168,26 @@ TraceFiles::TraceFiles(const std::string& folder, std::size_t most, const Clock&
       clock_(clock) {}
 
 Result<TraceFile> TraceFiles::reserve() const {
-    if (Result<Done> made = LinuxFileSystem().createDirectories(folder_, kFolderPermissions); !made) {
+    Result<FileDescriptor> made = makeFolders(folder_, kFolderPermissions);
+    if (!made) {
         return made.failure();
     }
-    for (const Numbered& part : filesWith(folder_, kPartSuffix)) {
-        removeWhenFree(part.path);
+    FileDescriptor folder = *std::move(made);
+    for (const Numbered& part : filesWith(folder, kPartSuffix)) {
+        removeWhenFree(folder, part.name);
     }
     constexpr int kMostTries = 100; // each lost to a service that cleans the same folder up
-    std::uint32_t number = highestNumber();
+    std::uint32_t number = highestNumber(folder);
     for (int tries = 0; tries < kMostTries; ++tries) {
         ++number;
-        std::string path = folder_ + "/" + std::string(kPrefix) + numberText(number) + "-" + timeText(clock_.now());
-        const std::string part = path + std::string(kPartSuffix);
-        FileDescriptor file(open(part.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, kFilePermissions));
-        struct stat made {};
+        const std::string name = std::string(kPrefix) + numberText(number) + "-" + timeText(clock_.now());
+        const std::string part = name + std::string(kPartSuffix);
+        FileDescriptor file(
+            openat(folder.get(), part.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, kFilePermissions));
+        struct stat status {};
         // Until it is locked it may be taken for one left behind.
-        if (file && lock(file) && fstat(file.get(), &made) == 0 && made.st_nlink > 0) {
-            return TraceFile(path + std::string(kSuffix), std::move(file));
+        if (file && lock(file) && fstat(file.get(), &status) == 0 && status.st_nlink > 0) {
+            return TraceFile(folder_ + "/" + name + std::string(kSuffix), std::move(folder), std::move(file));
         }
         if (errno != EEXIST && errno != EWOULDBLOCK) {
             break;
@@ -154,19 +196,14 @@ Result<TraceFile> TraceFiles::reserve() const {
     return failureOf("file for a trace in " + folder_, errno);
 }
 
-std::uint32_t TraceFiles::highestNumber() const {
-    std::uint32_t highest = 0;
-    for (const std::string_view suffix : {kSuffix, kPartSuffix}) {
-        const std::vector<Numbered> files = filesWith(folder_, suffix);
-        highest = std::max(highest, files.empty() ? 0 : files.back().number);
-    }
-    return highest;
-}
-
 void TraceFiles::removeOldest() const {
-    const std::vector<Numbered> files = filesWith(folder_, kSuffix);
+    const Result<FileDescriptor> folder = openFolder(folder_);
+    if (!folder) {
+        return;
+    }
+    const std::vector<Numbered> files = filesWith(*folder, kSuffix);
     for (std::size_t index = 0; index + most_ < files.size(); ++index) {
-        unlink(files[index].path.c_str());
+        unlinkat(folder->get(), files[index].name.c_str(), 0);
     }
 }
 

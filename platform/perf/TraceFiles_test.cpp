@@ -9,8 +9,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <optional>
+#include <sstream>
 #include <string>
 #include <sys/stat.h>
+#include <unistd.h>
 #include <utility>
 #include <vector>
 
@@ -29,6 +31,11 @@ protected:
         write(path() + "/" + name);
     }
     std::string path() const { return folder_ / "below/traces"; }
+    static std::string contentOf(const std::string& path) {
+        std::ostringstream text;
+        text << std::ifstream(path).rdbuf();
+        return text.str();
+    }
     std::vector<std::string> names() const {
         std::vector<std::string> names;
         std::error_code ignored;
@@ -133,6 +140,87 @@ TEST_F(TraceFilesTest, NothingIsPublishedWhereNothingWasWritten) {
     EXPECT_EQ(published.failure().code, ENODATA);
     EXPECT_EQ(published.failure().description,
               "result of the trace, " + path() + "/probe-000001-20231114T221320Z.data.part: nothing was written");
+}
+
+TEST_F(TraceFilesTest, WhatIsWrittenToTheDescriptorIsPublished) {
+    Result<TraceFile> file = files_.reserve();
+    ASSERT_TRUE(file);
+    TraceFile taken = *std::move(file);
+    ASSERT_EQ(::write(taken.held().get(), "profile", 7), 7);
+    const Result<std::string> published = taken.publish();
+    ASSERT_TRUE(published);
+    EXPECT_EQ(*published, path() + "/probe-000001-20231114T221320Z.data");
+    EXPECT_EQ(contentOf(*published), "profile");
+}
+
+TEST_F(TraceFilesTest, AnotherFileInItsPlaceIsNotPublishedAndStays) {
+    const std::string part = path() + "/probe-000001-20231114T221320Z.data.part";
+    {
+        Result<TraceFile> file = files_.reserve();
+        ASSERT_TRUE(file);
+        TraceFile taken = *std::move(file);
+        ASSERT_EQ(::write(taken.held().get(), "profile", 7), 7);
+        std::filesystem::remove(part);
+        std::ofstream(part) << "theirs";
+        const Result<std::string> published = taken.publish();
+        ASSERT_FALSE(published);
+        EXPECT_EQ(published.failure().code, ESTALE);
+        EXPECT_EQ(published.failure().description,
+                  "result of the trace, " + part + ": something else has taken its place");
+    }
+    EXPECT_THAT(names(), ElementsAre("probe-000001-20231114T221320Z.data.part"));
+    EXPECT_EQ(contentOf(part), "theirs");
+}
+
+TEST_F(TraceFilesTest, ALinkInItsPlaceIsNotPublishedAndStays) {
+    const std::string part = path() + "/probe-000001-20231114T221320Z.data.part";
+    {
+        Result<TraceFile> file = files_.reserve();
+        ASSERT_TRUE(file);
+        TraceFile taken = *std::move(file);
+        ASSERT_EQ(::write(taken.held().get(), "profile", 7), 7);
+        std::filesystem::rename(part, folder_ / "profile");
+        std::filesystem::create_symlink(folder_ / "profile", part);
+        const Result<std::string> published = taken.publish();
+        ASSERT_FALSE(published);
+        EXPECT_EQ(published.failure().code, ESTALE);
+    }
+    EXPECT_THAT(names(), ElementsAre("probe-000001-20231114T221320Z.data.part"));
+    EXPECT_TRUE(std::filesystem::is_symlink(part));
+    EXPECT_EQ(contentOf(folder_ / "profile"), "profile");
+}
+
+TEST_F(TraceFilesTest, AFolderThatIsMovedAwayMeanwhileKeepsItsFile) {
+    Result<TraceFile> file = files_.reserve();
+    ASSERT_TRUE(file);
+    TraceFile taken = *std::move(file);
+    ASSERT_EQ(::write(taken.held().get(), "profile", 7), 7);
+    std::filesystem::rename(path(), folder_ / "moved");
+    std::filesystem::create_directory(folder_ / "elsewhere");
+    std::filesystem::create_directory_symlink(folder_ / "elsewhere", path());
+    ASSERT_TRUE(taken.publish());
+    EXPECT_EQ(contentOf(folder_ / "moved/probe-000001-20231114T221320Z.data"), "profile");
+    EXPECT_TRUE(std::filesystem::is_empty(folder_ / "elsewhere"));
+}
+
+TEST_F(TraceFilesTest, AnotherUsersLinkInTheFoldersPlaceIsNotFollowed) {
+    constexpr uid_t kStranger = 4001;
+    std::filesystem::create_directories(folder_ / "elsewhere");
+    for (const char* const number : {"1", "2", "3", "4"}) {
+        write(folder_ / "elsewhere/probe-00000" + number + "-20231114T221320Z.data");
+    }
+    write(folder_ / "elsewhere/probe-000005-20231114T221320Z.data.part");
+    std::filesystem::create_directories(folder_ / "below");
+    std::filesystem::create_directory_symlink(folder_ / "elsewhere", path());
+    if (lchown(path().c_str(), kStranger, kStranger) != 0) {
+        GTEST_SKIP() << "gives a link to another user, which takes root";
+    }
+    files_.removeOldest();
+    const Result<TraceFile> file = files_.reserve();
+    ASSERT_FALSE(file);
+    EXPECT_EQ(file.failure().code, EACCES);
+    EXPECT_EQ(file.failure().description, "create folder " + path() + ": a link of user 4001 is not followed");
+    EXPECT_EQ(names().size(), 5U);
 }
 
 TEST_F(TraceFilesTest, ARelativeFolderGivesAnAbsolutePath) {

@@ -1,5 +1,6 @@
 #include "platform/spoor/EmitterRegistry.h"
 
+#include "platform/spoor/SlowPath.h"
 #include "platform/spoor/TraceEmitter.h"
 
 #include <pthread.h>
@@ -16,16 +17,19 @@ EmitterRegistry::EmitterRegistry() {
 }
 
 void EmitterRegistry::add(TraceEmitter& emitter) {
+    const SlowPath slow;
     const MutexLock lock(mutex_);
     emitters_.push_back(&emitter);
 }
 
 void EmitterRegistry::remove(TraceEmitter& emitter) {
+    const SlowPath slow;
     const MutexLock lock(mutex_);
     std::erase(emitters_, &emitter);
 }
 
 void EmitterRegistry::giveBack(const TraceRing* ring) {
+    const SlowPath slow;
     const MutexLock lock(mutex_);
     for (TraceEmitter* const emitter : emitters_) {
         emitter->giveBack(ring);
@@ -33,6 +37,7 @@ void EmitterRegistry::giveBack(const TraceRing* ring) {
 }
 
 void EmitterRegistry::beforeFork() {
+    SlowPath::begin();
     mutex_.lock();
     for (TraceEmitter* const emitter : emitters_) {
         emitter->mutex_.lock();
@@ -44,6 +49,7 @@ void EmitterRegistry::inParent() {
         emitter->mutex_.unlock();
     }
     mutex_.unlock();
+    SlowPath::end();
 }
 
 void EmitterRegistry::inChild() {
@@ -52,6 +58,7 @@ void EmitterRegistry::inChild() {
         emitter->mutex_.unlock();
     }
     mutex_.unlock();
+    SlowPath::end();
 }
 
 } // namespace vela::platform::spoor

@@ -88,7 +88,7 @@ private:
 
     const std::shared_ptr<TraceReader> reader_;
     const Clock& clock_;
-    const std::shared_ptr<TraceCollection> collection_ = std::make_shared<TraceCollection>();
+    const std::shared_ptr<TraceCollection> collection_ = std::make_shared<TraceCollection>(reader_->backlog());
     State state_ = State::Fresh;
     bool wallTimes_ = false;
 };

@@ -1,5 +1,6 @@
 #include "platform/spoor/RingFolder.h"
 
+#include "common/VelaReportingLogCategories.h"
 #include "platform/spoor/OwnerLock.h"
 #include "platform/spoor/SystemFailure.h"
 
@@ -7,6 +8,7 @@
 #include <cerrno>
 #include <dirent.h>
 #include <fcntl.h>
+#include <iterator>
 #include <memory>
 #include <unistd.h>
 #include <utility>
@@ -14,9 +16,6 @@
 namespace vela::platform::spoor {
 
 namespace {
-
-/// Names that one listing looks at.
-constexpr std::size_t kMostListed = 4096;
 
 /// A folder's time of change is that of the kernel's last tick, which is at most 10 ms ago.
 constexpr std::uint64_t kTick = 20'000'000;
@@ -62,12 +61,16 @@ Result<Done> RingFolder::begin() {
     if (!folder_) {
         return systemFailure("open " + path_, errno);
     }
+    toldOfRings_ = false;
+    toldOfNames_ = false;
+    passed_ = 0;
     list(true);
     return Done{};
 }
 
 void RingFolder::end() {
     rings_.clear();
+    unread_.clear();
     folder_ = FileDescriptor();
 }
 
@@ -97,7 +100,12 @@ void RingFolder::list(bool isFirst) {
     // A stream of its own: nobody else reads it meanwhile.
     while (const dirent* const entry = readdir(folder.get())) { // NOLINT(concurrency-mt-unsafe)
         const std::string name(&entry->d_name[0]);
-        if (++seen > kMostListed) {
+        if (++seen > kMostNames) {
+            if (!std::exchange(toldOfNames_, true)) {
+                VelaReportingTraceCategory().standard("kernel trace: %@ has more than its limit of %lu names: events "
+                                                      "of further rings are lost, uncounted",
+                                                      path_, kMostNames);
+            }
             return;
         }
         if (name.starts_with('.')) {
@@ -118,7 +126,17 @@ void RingFolder::sweepTemporary(const std::string& name) {
     }
 }
 
+bool RingFolder::hasRoom(uid_t owner) const {
+    const auto ofUser = static_cast<std::size_t>(
+        std::ranges::count_if(rings_, [&](const auto& entry) { return entry.second.owner == owner; }));
+    return rings_.size() < kMostRings && ofUser < kMostRingsOfUser;
+}
+
 void RingFolder::takeUp(const std::string& name, bool isFirst) {
+    const auto unread = unread_.find(name);
+    if (unread != unread_.end() && !hasRoom(unread->second.owner)) {
+        return;
+    }
     struct stat status {};
     Ring ring;
     ring.file = openForReading(folder_, name, status);
@@ -131,19 +149,54 @@ void RingFolder::takeUp(const std::string& name, bool isFirst) {
         removeFile(name, ring); // whoever collected meanwhile is gone, too
         return;
     }
-    const auto ofUser = static_cast<std::size_t>(
-        std::ranges::count_if(rings_, [&](const auto& entry) { return entry.second.owner == ring.owner; }));
-    if (rings_.size() >= kMostRings || ofUser >= kMostRingsOfUser) {
-        return;
-    }
     FileBytes bytes(ring.file.get());
     const auto fileBytes = static_cast<std::uint64_t>(status.st_size);
-    const Result<Done> begun = isFirst ? ring.reader.begin(bytes, fileBytes) : ring.reader.beginNew(bytes, fileBytes);
-    if (!begun) {
+    if (unread != unread_.end()) {
+        ring.reader = std::move(unread->second.reader);
+        ring.refused = unread->second.refused;
+        passed_ = ring.refused ? passed_ : saturatingSum(passed_, ring.reader.pass(bytes));
+        unread_.erase(unread);
+    } else if (!(isFirst ? ring.reader.begin(bytes, fileBytes) : ring.reader.beginNew(bytes, fileBytes))) {
         ring.refused = true; // remembered, so that it is not read again and again
+    }
+    if (ring.refused) {
         ring.file = FileDescriptor();
     }
-    rings_.emplace(name, std::move(ring));
+    if (hasRoom(ring.owner)) {
+        rings_.emplace(name, std::move(ring));
+    } else {
+        leave(name, std::move(ring));
+    }
+}
+
+void RingFolder::leave(const std::string& name, Ring ring) {
+    if (!ring.refused && !std::exchange(toldOfRings_, true)) {
+        VelaReportingTraceCategory().standard("kernel trace: no room for ring %@: the limit is %lu rings, %lu of one "
+                                              "user; events of further threads are lost",
+                                              name, kMostRings, kMostRingsOfUser);
+    }
+    if (unread_.size() < kMostNames) {
+        ring.file = FileDescriptor();
+        unread_.emplace(name, std::move(ring));
+    }
+}
+
+void RingFolder::countUnread(std::uint64_t& lost) {
+    for (auto entry = unread_.begin(); entry != unread_.end();) {
+        struct stat status {};
+        Ring& ring = entry->second;
+        ring.file = openForReading(folder_, entry->first, status);
+        const bool isDead = !ring.file || (!ring.refused && !hasLivingOwner(ring.file.get()));
+        if (ring.file && !ring.refused) {
+            FileBytes bytes(ring.file.get());
+            lost = saturatingSum(lost, ring.reader.pass(bytes));
+        }
+        if (ring.file && isDead) {
+            removeFile(entry->first, ring);
+        }
+        ring.file = FileDescriptor();
+        entry = isDead ? unread_.erase(entry) : std::next(entry);
+    }
 }
 
 void RingFolder::removeFile(const std::string& name, const Ring& ring) {
@@ -170,6 +223,10 @@ void RingFolder::drain(bool all, std::vector<TraceRecord>& records, std::uint64_
     if (isTouched() || all) {
         list(false);
     }
+    if (all) {
+        countUnread(lost);
+    }
+    lost = saturatingSum(lost, std::exchange(passed_, 0));
     const std::uint64_t now = traceNow();
     const bool looksForLife = all || now - checked_ > kLifeInterval;
     checked_ = looksForLife ? now : checked_;

@@ -1,5 +1,7 @@
+#include "platform/spoor/OwnerLock.h"
 #include "platform/spoor/RingFolder.h"
 #include "platform/spoor/TraceRing.h"
+#include "testing/CapturingLog.h"
 #include "testing/TemporaryFolder.h"
 
 #include <cerrno>
@@ -10,6 +12,7 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <vector>
 
 namespace vela::platform::spoor {
 namespace {
@@ -37,6 +40,19 @@ protected:
             codes.push_back(record.code);
         }
         return codes;
+    }
+    /// Rings of living emitters that are empty, and take no room on the disk.
+    std::vector<FileDescriptor> fill(std::size_t count) const {
+        std::vector<FileDescriptor> files;
+        for (std::size_t i = 0; i < count; ++i) {
+            const RingHeader header;
+            const std::string path = folder_ / (std::to_string(i) + "-empty.ring");
+            files.emplace_back(open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0644));
+            EXPECT_EQ(pwrite(files.back().get(), &header, sizeof(header), 0), ssize_t{sizeof(header)});
+            EXPECT_EQ(ftruncate(files.back().get(), kRingFileBytes), 0);
+            EXPECT_TRUE(lockAsOwner(files.back().get()));
+        }
+        return files;
     }
     std::size_t files() const {
         const std::filesystem::directory_iterator entries(folder_.path());
@@ -150,6 +166,95 @@ TEST_F(RingFolderTest, OneUserHasABoundedNumberOfRings) {
     }
     EXPECT_THAT(drain(true), IsEmpty());
     EXPECT_EQ(rings_.rings(), RingFolder::kMostRingsOfUser);
+}
+
+TEST_F(RingFolderTest, EventsOfARingWithoutRoomAreCountedAndToldOnce) {
+    const testing::CapturingLog log;
+    ASSERT_TRUE(rings_.begin());
+    const auto others = fill(RingFolder::kMostRingsOfUser);
+    EXPECT_THAT(drain(true), IsEmpty());
+    const auto first = makeRing();
+    const auto second = makeRing();
+    for (std::uint32_t i = 0; i < 20'000; ++i) {
+        EXPECT_TRUE(first->write(traceNow(), 1, {}));
+    }
+    EXPECT_TRUE(second->write(traceNow(), 2, {}));
+    second->addLost(3);
+    EXPECT_THAT(drain(true), IsEmpty());
+    EXPECT_EQ(lost_, 20'004U);
+    EXPECT_TRUE(second->write(traceNow(), 2, {}));
+    EXPECT_THAT(drain(true), IsEmpty());
+    EXPECT_EQ(lost_, 20'005U);
+    EXPECT_THAT(drain(true), IsEmpty());
+    EXPECT_EQ(lost_, 20'005U);
+    const auto lines = log.linesOf("velart");
+    ASSERT_EQ(lines.size(), 1U);
+    EXPECT_EQ(lines[0].level, LogLevel::Default);
+    EXPECT_THAT(lines[0].message,
+                ::testing::MatchesRegex("kernel trace: no room for ring [0-9-]*\\.ring: the limit is 512 rings, 256 of "
+                                        "one user; events of further threads are lost"));
+}
+
+TEST_F(RingFolderTest, WhatARingWithoutRoomHeldBeforeIsNotCounted) {
+    const auto others = fill(RingFolder::kMostRingsOfUser - 1);
+    std::vector<std::unique_ptr<TraceRing>> own; // one of them has room
+    for (int i = 0; i < 4; ++i) {
+        own.push_back(makeRing());
+        EXPECT_TRUE(own.back()->write(traceNow(), 1, {}));
+    }
+    ASSERT_TRUE(rings_.begin());
+    EXPECT_EQ(rings_.rings(), 256U);
+    for (const auto& ring : own) {
+        EXPECT_TRUE(ring->write(traceNow(), 2, {}));
+    }
+    const std::size_t read = drain(true).size();
+    EXPECT_EQ(read + lost_, 4U);
+}
+
+TEST_F(RingFolderTest, ARingWithoutRoomIsReadWhenThereIsRoom) {
+    ASSERT_TRUE(rings_.begin());
+    auto others = fill(RingFolder::kMostRingsOfUser);
+    EXPECT_THAT(drain(true), IsEmpty());
+    const auto ring = makeRing();
+    EXPECT_TRUE(ring->write(traceNow(), 1, {}));
+    EXPECT_THAT(drain(true), IsEmpty());
+    EXPECT_EQ(lost_, 1U);
+    others.pop_back();
+    EXPECT_TRUE(ring->write(traceNow(), 2, {}));
+    EXPECT_THAT(drain(true), IsEmpty()); // finds the dead one
+    EXPECT_TRUE(ring->write(traceNow(), 3, {}));
+    EXPECT_THAT(drain(true), IsEmpty());
+    EXPECT_EQ(lost_, 3U);
+    EXPECT_TRUE(ring->write(traceNow(), 4, {}));
+    EXPECT_THAT(drain(), ElementsAre(4));
+    EXPECT_EQ(lost_, 3U);
+}
+
+TEST_F(RingFolderTest, ADeadRingWithoutRoomIsCountedToItsEndAndRemoved) {
+    ASSERT_TRUE(rings_.begin());
+    const auto others = fill(RingFolder::kMostRingsOfUser);
+    EXPECT_THAT(drain(true), IsEmpty());
+    auto ring = makeRing();
+    EXPECT_TRUE(ring->write(traceNow(), 1, {}));
+    ring.reset();
+    EXPECT_EQ(files(), 257U);
+    EXPECT_THAT(drain(true), IsEmpty());
+    EXPECT_EQ(lost_, 1U);
+    EXPECT_EQ(files(), 256U);
+}
+
+TEST_F(RingFolderTest, MoreNamesThanAreLookedAtAreToldOnce) {
+    const testing::CapturingLog log;
+    for (std::size_t i = 0; i < 4097; ++i) {
+        std::ofstream(folder_ / (std::to_string(i) + ".txt")).flush();
+    }
+    ASSERT_TRUE(rings_.begin());
+    EXPECT_THAT(drain(true), IsEmpty());
+    const auto lines = log.linesOf("velart");
+    ASSERT_EQ(lines.size(), 1U);
+    EXPECT_EQ(lines[0].message, "kernel trace: " + folder_.path() +
+                                    " has more than its limit of 4096 names: events of further rings are lost, "
+                                    "uncounted");
 }
 
 TEST_F(RingFolderTest, WithoutAFolderItDoesNotBegin) {

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <atomic>
+#include <utility>
 
 namespace vela::platform::spoor {
 
@@ -76,15 +77,25 @@ void RingReader::take(std::uint64_t begin, std::uint64_t end, std::uint64_t whol
     }
 }
 
+std::uint64_t RingReader::takeLost() {
+    const std::uint64_t before = std::exchange(lost_, std::max(lost_, header_.lost));
+    return lost_ - before;
+}
+
+std::uint64_t RingReader::pass(RingBytes& ring) {
+    if (!readHeader(ring)) {
+        return 0;
+    }
+    const std::uint64_t before = std::exchange(tail_, std::max(tail_, header_.head));
+    return saturatingSum(tail_ - before, takeLost());
+}
+
 RingReader::Progress RingReader::read(RingBytes& ring, std::uint64_t now, std::vector<TraceRecord>& records) {
     Progress progress;
     if (!readHeader(ring)) {
         return {false, 0, 0};
     }
-    if (header_.lost > lost_) {
-        progress.lost = header_.lost - lost_;
-        lost_ = header_.lost;
-    }
+    progress.lost = takeLost();
     const std::uint64_t head = header_.head;
     if (head <= tail_) {
         return progress;

@@ -37,9 +37,14 @@ public:
     /// a lie and becomes `now`. At most all of the ring at a time.
     Progress read(RingBytes& ring, std::uint64_t now, std::vector<TraceRecord>& records);
 
+    /// Passes over the events since the last time and answers how many they are, with those that the emitter could not
+    /// write.
+    std::uint64_t pass(RingBytes& ring);
+
 private:
     Result<Done> learn(RingBytes& ring, std::uint64_t fileBytes);
     bool readHeader(RingBytes& ring);
+    std::uint64_t takeLost();
     bool readRange(RingBytes& ring, std::uint64_t begin, std::uint64_t end);
     static bool stillHolds(RingBytes& ring, std::uint64_t index);
     void take(std::uint64_t begin, std::uint64_t end, std::uint64_t whole, std::uint64_t now, Progress& progress,

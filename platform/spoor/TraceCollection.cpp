@@ -30,6 +30,30 @@ private:
     const std::lock_guard<std::mutex> lock_;
 };
 
+/// Events on their way, which wait until this is gone: also where the queue is destroyed and never passes them.
+class TraceCollection::Batch {
+public:
+    Batch(std::shared_ptr<TraceCollection> collection, std::vector<TraceRecord> records)
+        : collection_(std::move(collection)),
+          records_(std::move(records)) {}
+    Batch(Batch&& other) noexcept = default;
+    Batch& operator=(Batch&&) = delete;
+    Batch(const Batch&) = delete;
+    Batch& operator=(const Batch&) = delete;
+    ~Batch() {
+        if (collection_ != nullptr) {
+            collection_->waiting_ -= records_.size();
+            collection_->backlog_->giveBack(records_.size());
+        }
+    }
+
+    void pass() const { collection_->pass(records_); }
+
+private:
+    std::shared_ptr<TraceCollection> collection_;
+    std::vector<TraceRecord> records_;
+};
+
 bool TraceCollection::isWanted(const TraceRecord& record) const {
     return std::ranges::any_of(ranges_, [&](const Range& range) { return holds(range, record.code); });
 }
@@ -45,12 +69,11 @@ void TraceCollection::deliver(std::span<const TraceRecord> records, std::uint64_
         return;
     }
     const std::uint64_t room = kMostWaiting - std::min<std::uint64_t>(kMostWaiting, waiting_);
-    if (wanted.size() > room) {
-        addLost(wanted.size() - room);
-        wanted.resize(static_cast<std::size_t>(room));
-    }
-    waiting_ += wanted.size();
-    queue_->post([self = shared_from_this(), wanted = std::move(wanted)] { self->pass(wanted); });
+    const std::uint64_t taken = backlog_->take(std::min<std::uint64_t>(room, wanted.size()));
+    addLost(wanted.size() - taken);
+    wanted.resize(static_cast<std::size_t>(taken));
+    waiting_ += taken;
+    queue_->post([batch = Batch(shared_from_this(), std::move(wanted))] { batch.pass(); });
 }
 
 SpoorEvent TraceCollection::eventOf(const TraceRecord& record) const {
@@ -83,7 +106,6 @@ void TraceCollection::pass(const std::vector<TraceRecord>& records) {
             }
         }
     }
-    waiting_ -= records.size();
 }
 
 void TraceCollection::complete(std::shared_ptr<TraceCollection> collection) {

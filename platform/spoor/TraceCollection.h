@@ -5,6 +5,7 @@
 
 #include "platform/Spoor.h"
 #include "platform/WorkQueue.h"
+#include "platform/spoor/TraceBacklog.h"
 #include "platform/spoor/TraceRecord.h"
 
 #include <atomic>
@@ -15,14 +16,17 @@
 #include <optional>
 #include <span>
 #include <thread>
+#include <utility>
 #include <vector>
 
 namespace vela::platform::spoor {
 
 class TraceCollection : public std::enable_shared_from_this<TraceCollection> {
 public:
-    /// Events that wait on the session's queue; what comes beyond them is lost.
+    /// Events that wait on the session's queue; what comes beyond them, or beyond the backlog's room, is lost.
     static constexpr std::uint64_t kMostWaiting = std::uint64_t{1} << 20U;
+
+    explicit TraceCollection(std::shared_ptr<TraceBacklog> backlog) : backlog_(std::move(backlog)) {}
 
     struct Range {
         std::uint32_t first;
@@ -51,12 +55,15 @@ public:
     std::uint64_t lost() const { return lost_; }
 
 private:
+    class Batch;
     class Delivering;
 
     void pass(const std::vector<TraceRecord>& records);
     void passCompletion();
     bool isWanted(const TraceRecord& record) const;
     SpoorEvent eventOf(const TraceRecord& record) const;
+
+    const std::shared_ptr<TraceBacklog> backlog_;
 
     // Constant after the start.
     std::vector<Range> ranges_;

@@ -3,6 +3,7 @@
 #include "platform/spoor/EmitterRegistry.h"
 #include "platform/spoor/FtracePage.h"
 #include "platform/spoor/OwnerLock.h"
+#include "platform/spoor/SlowPath.h"
 
 #include <algorithm>
 #include <array>
@@ -90,6 +91,10 @@ TraceEmitter::~TraceEmitter() {
 }
 
 const ControlPage* TraceEmitter::attach() {
+    if (SlowPath::isUnderWay()) {
+        return page_.load(std::memory_order_acquire);
+    }
+    const SlowPath slow;
     const std::uint64_t now = nanosecondsOf(CLOCK_MONOTONIC_COARSE);
     std::uint64_t next = nextAttach_.load(std::memory_order_acquire);
     // The first time every thread waits for the one that looks; later they go on without.
@@ -139,6 +144,7 @@ bool TraceEmitter::attachTo(const EmitterFolder& folder, bool living) {
 }
 
 bool TraceEmitter::hasLivingService() {
+    const SlowPath slow;
     const MutexLock lock(mutex_);
     return control_ && hasLivingOwner(control_.get());
 }
@@ -146,6 +152,7 @@ bool TraceEmitter::hasLivingService() {
 void TraceEmitter::leave() {
     const ControlPage* const page = page_.load(std::memory_order_acquire);
     if (page != nullptr && load(page->active) == 0) {
+        const SlowPath slow;
         const MutexLock lock(mutex_);
         for (const Held& held : rings_) {
             held.ring->remove();
@@ -155,9 +162,10 @@ void TraceEmitter::leave() {
 
 Emission TraceEmitter::emitNow(std::uint32_t code, const TraceArguments& arguments) {
     const KeptErrno kept;
+    const bool interruptsSlowPath = SlowPath::isUnderWay();
     const ControlPage* page = page_.load(std::memory_order_acquire);
     if (page == nullptr && (page = attach()) == nullptr) {
-        return Emission::NoService;
+        return interruptsSlowPath ? lose() : Emission::NoService; // nobody knows yet who collects
     }
     const std::uint32_t active = load(page->active, __ATOMIC_ACQUIRE);
     if (active == 0) {
@@ -177,6 +185,9 @@ Emission TraceEmitter::emitNow(std::uint32_t code, const TraceArguments& argumen
             }
             if (load(page->active) == 0 || load(page->generation) != generation) {
                 return Emission::NobodyCollects; // the last session ended, after which the kernel takes nothing
+            }
+            if (interruptsSlowPath) {
+                return lose();
             }
             if (!hasLivingService()) {
                 abandonedGeneration_ = generation;
@@ -201,6 +212,10 @@ int TraceEmitter::marker(const ControlPage& page) {
 }
 
 int TraceEmitter::openMarker(const ControlPage& page) {
+    if (SlowPath::isUnderWay()) {
+        return -1;
+    }
+    const SlowPath slow;
     const MutexLock lock(mutex_);
     const std::uint32_t serial = load(page.markerSerial, __ATOMIC_ACQUIRE);
     const std::uint64_t state = markerState_.load(std::memory_order_relaxed);
@@ -229,6 +244,19 @@ bool TraceEmitter::writeMarker(int marker, std::uint32_t code, const TraceArgume
     return write(marker, &event, sizeof(event)) == static_cast<ssize_t>(sizeof(event));
 }
 
+Emission TraceEmitter::lose() {
+    countLost(1);
+    return Emission::Lost;
+}
+
+void TraceEmitter::countLost(std::uint64_t events) {
+    lost_ += events;
+    // The first ring may come at any time: whoever is later, this or its maker, sees the other's.
+    if (TraceRing* const ring = countingRing_; ring != nullptr) {
+        ring->addLost(lost_.exchange(0));
+    }
+}
+
 Emission TraceEmitter::emitToRing(const ControlPage& page, std::uint32_t code, const TraceArguments& arguments) {
     const std::uint64_t now = traceNow();
     const std::uint64_t heard = load(page.heartbeat);
@@ -237,8 +265,7 @@ Emission TraceEmitter::emitToRing(const ControlPage& page, std::uint32_t code, c
     }
     TraceRing* const own = ring();
     if (own == nullptr) {
-        lost_.fetch_add(1, std::memory_order_relaxed);
-        return Emission::Lost;
+        return lose();
     }
     return own->write(now, code, arguments) ? Emission::Emitted : Emission::Lost;
 }
@@ -252,6 +279,10 @@ TraceRing* TraceEmitter::ring() {
 }
 
 TraceRing* TraceEmitter::takeRing() {
+    if (SlowPath::isUnderWay()) {
+        return nullptr;
+    }
+    const SlowPath slow;
     const std::uint64_t now = nanosecondsOf(CLOCK_MONOTONIC_COARSE);
     if (now < nextRing_.load(std::memory_order_relaxed)) {
         return nullptr;
@@ -261,6 +292,8 @@ TraceRing* TraceEmitter::takeRing() {
     if (free == rings_.end() && rings_.size() < kMostRings) {
         if (auto made = TraceRing::create(ringFolder_)) {
             free = rings_.insert(rings_.end(), {*std::move(made), false});
+            countingRing_ = rings_.front().ring.get();
+            countLost(0);
         }
     }
     if (free == rings_.end() || pthread_setspecific(key_, free->ring.get()) != 0) {
@@ -269,7 +302,6 @@ TraceRing* TraceEmitter::takeRing() {
     }
     free->taken = true;
     free->ring->adopt();
-    free->ring->addLost(lost_.exchange(0));
     return free->ring.get();
 }
 
@@ -286,6 +318,7 @@ void TraceEmitter::prepareThread() {
 }
 
 void TraceEmitter::giveBack(const TraceRing* ring) {
+    const SlowPath slow;
     const MutexLock lock(mutex_);
     const auto found = std::ranges::find_if(rings_, [&](const Held& held) { return held.ring.get() == ring; });
     if (found != rings_.end()) {
@@ -294,6 +327,7 @@ void TraceEmitter::giveBack(const TraceRing* ring) {
 }
 
 void TraceEmitter::forgetRings() {
+    countingRing_ = nullptr;
     rings_.clear();
     lost_ = 0;
     nextRing_ = 0;

@@ -3,8 +3,9 @@
 //
 // Thread-safe. While nobody collects, an emission is two loads and a branch. The first emission of a process, and of a
 // thread that needs a ring, allocates, takes locks and makes system calls; later ones take no lock and allocate
-// nothing. errno stays. In a forked child, threads get rings of the child's own. The destructor is for a time when no
-// thread emits any more.
+// nothing. errno stays. An emission from a handler of a signal that interrupts the slow one of its own thread counts as
+// lost. In a forked child, threads get rings of the child's own. The destructor is for a time when no thread emits any
+// more.
 #pragma once
 
 #include "platform/Mutex.h"
@@ -34,7 +35,7 @@ enum class Emission : std::uint8_t {
 
 class TraceEmitter {
 public:
-    /// Rings of one process. Further threads' events are lost.
+    /// Rings of one process. Further threads' events are lost, and counted in its first ring.
     static constexpr std::size_t kMostRings = 256;
 
     explicit TraceEmitter(std::vector<EmitterFolder> folders);
@@ -62,6 +63,9 @@ public:
     /// The process ends: while nobody collects, its rings go with it.
     void leave();
 
+    /// Counts events that were never emitted here. Takes no lock.
+    void countLost(std::uint64_t events);
+
 private:
     friend class EmitterRegistry;
 
@@ -75,6 +79,7 @@ private:
     int marker(const ControlPage& page);
     int openMarker(const ControlPage& page) VELA_EXCLUDES(mutex_);
     bool writeMarker(int marker, std::uint32_t code, const TraceArguments& arguments);
+    Emission lose();
     Emission emitToRing(const ControlPage& page, std::uint32_t code, const TraceArguments& arguments);
     TraceRing* ring();
     TraceRing* takeRing();
@@ -94,7 +99,8 @@ private:
     // Generations of the page; beyond 32 bits: none.
     std::atomic<std::uint64_t> deadGeneration_;      ///< in which the marker takes nothing
     std::atomic<std::uint64_t> abandonedGeneration_; ///< in which the service died
-    std::atomic<std::uint64_t> lost_ = 0;            ///< not yet counted in a ring
+    std::atomic<std::uint64_t> lost_ = 0;            ///< before there was a ring to count them in
+    std::atomic<TraceRing*> countingRing_ = nullptr; ///< the first one
     Mutex mutex_;
     FileDescriptor control_ VELA_GUARDED_BY(mutex_);
     std::string ringFolder_ VELA_GUARDED_BY(mutex_);

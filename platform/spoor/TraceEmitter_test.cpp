@@ -1,4 +1,5 @@
 #include "platform/spoor/RingFolder.h"
+#include "platform/spoor/SlowPath.h"
 #include "platform/spoor/TraceControl.h"
 #include "platform/spoor/TraceEmitter.h"
 #include "testing/TemporaryFolder.h"
@@ -314,6 +315,80 @@ TEST_F(TraceEmitterTest, EventsOfASignalsHandlerAreWrittenOrCounted) {
     sigaction(SIGALRM, &before, nullptr);
     seen += drain().size();
     EXPECT_EQ(seen + lost_, own + static_cast<std::size_t>(interruptions));
+}
+
+// Each round has an emitter that knows nothing yet: the handler comes in the midst of its finding the service and of
+// its making a ring, where locks are held.
+TEST_F(TraceEmitterTest, ASignalsHandlerMayEmitInTheMidstOfTheFirstEvent) {
+    constexpr std::size_t kRounds = 30;
+    collect();
+    interruptions = 0;
+    struct sigaction action {};
+    struct sigaction before {};
+    action.sa_handler = emitInHandler;
+    ASSERT_EQ(sigaction(SIGALRM, &action, &before), 0);
+    const itimerval often{{0, 100}, {0, 50}};
+    const itimerval never{};
+    std::size_t seen = 0;
+    for (std::size_t round = 0; round < kRounds; ++round) {
+        {
+            TraceEmitter fresh({{folder_.path(), true}});
+            interruptedEmitter = &fresh;
+            setitimer(ITIMER_REAL, &often, nullptr);
+            const Emission emission = fresh.emitNow(1, {});
+            setitimer(ITIMER_REAL, &never, nullptr);
+            EXPECT_EQ(emission, Emission::Emitted);
+        }
+        seen += drain().size();
+    }
+    sigaction(SIGALRM, &before, nullptr);
+    EXPECT_EQ(seen + lost_, kRounds + static_cast<std::size_t>(interruptions));
+}
+
+TEST_F(TraceEmitterTest, WhatInterruptsTheSlowPathOfItsThreadIsLostAndCounted) {
+    collect();
+    {
+        const SlowPath slow;
+        EXPECT_EQ(emitter_.emitNow(1, {}), Emission::Lost) << "nothing is known yet";
+    }
+    EXPECT_EQ(ringFiles(), 0U);
+    EXPECT_EQ(emitter_.emitNow(2, {}), Emission::Emitted);
+    {
+        const SlowPath slow;
+        EXPECT_EQ(emitter_.emitNow(3, {}), Emission::Emitted) << "the thread has its ring";
+        std::thread([&] { EXPECT_EQ(emitter_.emitNow(4, {}), Emission::Emitted); }).join();
+    }
+    std::thread([&] {
+        const SlowPath slow;
+        EXPECT_EQ(emitter_.emitNow(5, {}), Emission::Lost) << "the thread has none";
+    }).join();
+    EXPECT_EQ(drain().size(), 3U);
+    EXPECT_EQ(lost_, 2U);
+}
+
+TEST_F(TraceEmitterTest, EventsOfThreadsWithoutARingAreCountedInTheFirstRing) {
+    collect();
+    EXPECT_EQ(emitter_.emitNow(1, {}), Emission::Emitted);
+    EXPECT_EQ(drain().size(), 1U);
+    std::filesystem::rename(ringFolder(folder_.path()), folder_ / "away");
+    std::thread([&] {
+        for (int i = 0; i < 3; ++i) {
+            EXPECT_EQ(emitter_.emitNow(2, {}), Emission::Lost);
+        }
+    }).join();
+    EXPECT_EQ(drain().size(), 0U);
+    EXPECT_EQ(lost_, 3U);
+}
+
+TEST_F(TraceEmitterTest, EventsLostBeforeTheFirstRingAreCountedInIt) {
+    collect();
+    emitter_.countLost(2);
+    EXPECT_EQ(emitter_.emitNow(1, {}), Emission::Emitted);
+    EXPECT_EQ(drain().size(), 1U);
+    EXPECT_EQ(lost_, 2U);
+    emitter_.countLost(1);
+    EXPECT_EQ(drain().size(), 0U);
+    EXPECT_EQ(lost_, 3U);
 }
 
 } // namespace

@@ -5,6 +5,7 @@
 #include "platform/Result.h"
 #include "platform/spoor/FtraceInstance.h"
 #include "platform/spoor/RingFolder.h"
+#include "platform/spoor/TraceBacklog.h"
 #include "platform/spoor/TraceCollection.h"
 #include "platform/spoor/TraceControl.h"
 #include "platform/spoor/TraceMerge.h"
@@ -44,6 +45,9 @@ public:
     /// The collection's queue is not used any more when this returns. Nothing happens when it had completed.
     void remove(const TraceCollection& collection);
 
+    /// What all of its collections share.
+    const std::shared_ptr<TraceBacklog>& backlog() const { return backlog_; }
+
     /// Whether the kernel collects, too. Once a collection has begun.
     bool usesFtrace();
 
@@ -70,6 +74,7 @@ private:
     void rest(std::unique_lock<std::mutex>& lock);
 
     const TraceReaderOptions options_;
+    const std::shared_ptr<TraceBacklog> backlog_ = std::make_shared<TraceBacklog>();
     std::mutex mutex_; ///< guards all below; the thread gives it up while it waits
     std::condition_variable wake_;
     std::unique_ptr<TraceControl> control_;

@@ -8,6 +8,7 @@
 #include <sched.h>
 #include <sys/mman.h>
 #include <sys/random.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
@@ -25,6 +26,23 @@ std::string newName() {
         number = traceNow(); // only right after the system's start
     }
     return std::to_string(getpid()) + "-" + std::to_string(gettid()) + "-" + std::to_string(number);
+}
+
+/// Of rings, in this process.
+std::atomic<std::uint64_t> lockedBytes = 0;
+
+/// A program may lock memory of its own, so that half of its allowance stays its own.
+bool lockMemory(void* begin) {
+    rlimit allowed{};
+    if (getrlimit(RLIMIT_MEMLOCK, &allowed) != 0) {
+        return false;
+    }
+    const std::uint64_t locked = lockedBytes += kRingFileBytes;
+    if ((allowed.rlim_cur == RLIM_INFINITY || locked < allowed.rlim_cur / 2) && mlock(begin, kRingFileBytes) == 0) {
+        return true;
+    }
+    lockedBytes -= kRingFileBytes;
+    return false;
 }
 
 template <class Word>
@@ -60,7 +78,7 @@ Result<std::unique_ptr<TraceRing>> TraceRing::create(const std::string& folder) 
     }
     if (error == 0) {
         // A real-time thread should meet no page that is not there. Where the limit of locked memory is low, it may.
-        mlock(ring->header_, kRingFileBytes);
+        ring->locked_ = lockMemory(ring->header_);
         *ring->header_ = RingHeader();
         ring->header_->pid = getpid();
         ring->path_ = folder + "/" + name + std::string(kRingSuffix);
@@ -76,6 +94,9 @@ Result<std::unique_ptr<TraceRing>> TraceRing::create(const std::string& folder) 
 TraceRing::~TraceRing() {
     if (header_ != nullptr) {
         munmap(header_, kRingFileBytes);
+    }
+    if (locked_) {
+        lockedBytes -= kRingFileBytes;
     }
 }
 

@@ -15,7 +15,8 @@ namespace vela::platform::spoor {
 
 class TraceRing {
 public:
-    /// Makes a ring in `folder`, which is there. All of its memory is present afterwards.
+    /// Makes a ring in `folder`, which is there. All of its memory is present afterwards, and locked while all locked
+    /// rings of the process are below half of what it may lock (RLIMIT_MEMLOCK).
     static Result<std::unique_ptr<TraceRing>> create(const std::string& folder);
     /// The file stays, for its reader to come to its end.
     ~TraceRing();
@@ -40,6 +41,7 @@ private:
     std::string path_;
     FileDescriptor file_; ///< its lock tells that the emitter lives
     RingHeader* header_ = nullptr;
+    bool locked_ = false;
     std::uint64_t head_ = 0;
     std::uint64_t thread_ = 0;
     volatile bool writing_ = false;

@@ -18,8 +18,13 @@
  *
  * The first event of a process that a session collects, and the first one of each thread that then needs memory to
  * share (1 MiB, for which at most 256 threads of a process have room), make system calls and take locks.
- * VelaReportingTracePrepareThread does that beforehand. In a handler of a signal, an event that interrupts another one
- * of its thread is lost, and counted.
+ * VelaReportingTracePrepareThread does that beforehand. The memory to share is locked into RAM as long as that takes
+ * less than half of what the process may lock (RLIMIT_MEMLOCK): with the usual 8 MiB that of three threads, and the
+ * program has the rest for itself. What is not locked is present as well, but may be swapped out.
+ *
+ * Handlers of signals may emit where the interrupted thread was prepared: by VelaReportingTracePrepareThread, or by an
+ * event of its own. An event that interrupts another one of its thread, or the preparation, is lost, and counted. An
+ * unprepared thread allocates at its first event, which a handler must not do in the midst of another allocation.
  *
  * No service is needed. Where none has ever run, a process looks for one once a second at most, when it emits. It looks
  * in $VELA_RUNTIME when that is set, else in $XDG_RUNTIME_DIR/vela, if its files are this user's or root's, and in
