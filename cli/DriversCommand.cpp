@@ -18,6 +18,7 @@
 #include <optional>
 #include <ostream>
 #include <sstream>
+#include <system_error>
 #include <thread>
 #include <utility>
 #include <vector>
@@ -166,7 +167,7 @@ void printJson(const HwStatsChannel& channel, std::optional<double> time, std::o
 class Drivers {
 public:
     Drivers(const Settings& settings, bool json, Console& console)
-        : options_(platform::hwStatsOptionsOf(settings)),
+        : options_(optionsFor(settings)),
           hwStats_(options_, clock_),
           json_(json),
           console_(console) {
@@ -175,6 +176,9 @@ public:
             subscriptions_.push_back(hwStats_.createSubscription(*channels.thing));
         }
     }
+
+    /// Whether something was left out, which standard error says.
+    bool hasFaults() const { return hasFaults_; }
 
     /// Prints what there is.
     void list() {
@@ -219,6 +223,17 @@ public:
 private:
     using SamplesOfGroup = std::shared_ptr<const HwStatsSamples>;
 
+    platform::LinuxHwStatsOptions optionsFor(const Settings& settings) {
+        platform::LinuxHwStatsOptions options = platform::hwStatsOptionsOf(settings);
+        options.complain = [this](const std::string& fault) { complain(fault); };
+        return options;
+    }
+
+    void complain(const std::string& fault) {
+        hasFaults_ = true;
+        console_.error << "velactl: " << fault << '\n';
+    }
+
     static TextTable makeTable() { return TextTable({"GROUP", "DRIVER", "CHANNEL", "FORMAT", "VALUE"}); }
 
     double wallSeconds() const { return std::chrono::duration<double>(clock_.now().time_since_epoch()).count(); }
@@ -228,10 +243,9 @@ private:
         std::vector<SamplesOfGroup> samples;
         for (const auto& subscription : subscriptions_) {
             auto answer = hwStats_.createSamples(*subscription.subscription, *subscription.subscribed);
-            if (answer.error && !hasComplained_) {
-                hasComplained_ = true;
-                console_.error << "velactl: " << escapedText(options_.channelFolder) << ": cannot be read, error "
-                               << answer.error->code << '\n';
+            if (answer.error && !std::exchange(isFolderTold_, true)) {
+                const std::error_code reason(static_cast<int>(answer.error->code), std::system_category());
+                complain(escapedText(options_.channelFolder) + ": cannot be read: " + reason.message());
             }
             samples.push_back(std::move(answer.thing));
         }
@@ -270,7 +284,8 @@ private:
     const bool json_;
     Console& console_;
     std::vector<platform::HwStats::SubscriptionAnswer> subscriptions_; ///< one for each group
-    bool hasComplained_ = false;
+    bool isFolderTold_ = false;
+    bool hasFaults_ = false;
 };
 
 /// The number of `--count`, none without one; a reason in `fault` where it cannot be.
@@ -312,7 +327,7 @@ int runDrivers(std::span<const std::string_view> arguments, Console& console) {
     } else {
         drivers.list();
     }
-    return kDone;
+    return drivers.hasFaults() ? kFailed : kDone;
 }
 
 } // namespace vela

@@ -3,6 +3,7 @@
 #include "common/values/Utf8.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstring>
 #include <utility>
@@ -12,51 +13,74 @@ namespace vela::platform::hwstats {
 namespace {
 
 constexpr std::uint16_t kAbsentText = 0xFFFF;
+/// A counter with a name of one letter.
+constexpr std::size_t kLeastChannelBytes = 8;
 
 Failure refused(std::string reason) { return {EINVAL, std::move(reason)}; }
 
-/// Texts become parts of keys and lines of logs.
-bool isText(std::string_view text) {
+/// Why a text cannot be, or "". Texts become parts of keys and lines of logs.
+std::string faultOfText(const std::string& what, std::string_view text) {
     const auto isControl = [](char character) {
         return static_cast<unsigned char>(character) < ' ' || character == '\x7F';
     };
-    return text.size() <= kMostTextBytes && std::ranges::none_of(text, isControl) && isValidUtf8(text);
+    if (text.size() > kMostTextBytes) {
+        return what + " has " + std::to_string(text.size()) + " bytes, more than " + std::to_string(kMostTextBytes);
+    }
+    if (std::ranges::any_of(text, isControl)) {
+        return what + " has control characters";
+    }
+    return isValidUtf8(text) ? "" : what + " is no UTF-8";
+}
+
+std::string faultOfName(const std::string& what, std::string_view name) {
+    return name.empty() ? what + " is empty" : faultOfText(what, name);
 }
 
 bool isRising(const std::vector<std::int64_t>& bounds) {
     return std::ranges::adjacent_find(bounds, std::ranges::greater_equal()) == bounds.end();
 }
 
+std::string faultOfStates(const std::vector<std::string>& states) {
+    if (states.empty() || states.size() > kMostParts) {
+        return "a state channel has 1 to " + std::to_string(kMostParts) + " states";
+    }
+    for (const std::string& state : states) {
+        if (std::string fault = faultOfName("a state's name", state); !fault.empty()) {
+            return fault;
+        }
+    }
+    return "";
+}
+
 /// Why a channel cannot be, or "".
 std::string faultOf(const ChannelDescription& channel) {
-    if (channel.name.empty() || !isText(channel.name) || (channel.unit && !isText(*channel.unit))) {
-        return "a channel's name or unit is empty, too long or no text";
+    if (std::string fault = faultOfName("a channel's name", channel.name); !fault.empty()) {
+        return fault;
+    }
+    if (std::string fault = faultOfText("a channel's unit", channel.unit.value_or("")); !fault.empty()) {
+        return fault;
     }
     const std::size_t parts = channel.parts();
-    switch (channel.format) {
-    case HwStatsFormat::Simple:
+    if (channel.format == HwStatsFormat::Simple) {
         return channel.bounds.empty() && channel.states.empty() ? "" : "a counter has neither buckets nor states";
-    case HwStatsFormat::Histogram:
-        if (!channel.states.empty() || parts == 0 || parts > kMostParts || !isRising(channel.bounds)) {
-            return "a histogram has 1 to " + std::to_string(kMostParts) + " buckets with rising bounds";
-        }
-        return "";
-    case HwStatsFormat::State:
-        if (!channel.bounds.empty() || parts == 0 || parts > kMostParts ||
-            !std::ranges::all_of(channel.states, [](const auto& name) { return !name.empty() && isText(name); })) {
-            return "a state channel has 1 to " + std::to_string(kMostParts) + " states with names";
-        }
-        return "";
-    default:
-        return "a channel is of no known format or has parts that do not suit it";
     }
+    if (channel.format == HwStatsFormat::Histogram && channel.states.empty()) {
+        const bool isRight = parts > 0 && parts <= kMostParts && isRising(channel.bounds);
+        return isRight ? "" : "a histogram has 1 to " + std::to_string(kMostParts) + " buckets with rising bounds";
+    }
+    if (channel.format == HwStatsFormat::State && channel.bounds.empty()) {
+        return faultOfStates(channel.states);
+    }
+    return "a channel is of no known format or has parts that do not suit it";
 }
 
 /// Why the table, its channels apart, cannot be, or "".
 std::string faultOfNames(const ChannelTable& table) {
-    for (const auto* text : {&table.driverName, &table.group, &table.subGroup}) {
-        if (*text && (text->value().empty() || !isText(**text))) {
-            return "the driver's name or a group is empty, too long or no text";
+    const std::array<std::pair<const char*, const std::optional<std::string>&>, 3> names{
+        {{"the driver's name", table.driverName}, {"the group", table.group}, {"the subgroup", table.subGroup}}};
+    for (const auto& [what, name] : names) {
+        if (std::string fault = name ? faultOfName(what, *name) : ""; !fault.empty()) {
+            return fault;
         }
     }
     if (table.channels.empty() || table.channels.size() > kMostFileChannels) {
@@ -108,13 +132,17 @@ public:
     }
     std::string text() { return optionalText().value_or(""); }
 
+    /// Whether that many bytes are left. If not, they are missing.
+    bool offers(std::size_t bytes) {
+        failed_ = failed_ || bytes > rest_.size();
+        return !failed_;
+    }
     std::size_t rest() const { return rest_.size(); }
     bool failed() const { return failed_; }
 
 private:
     std::string_view take(std::size_t size) {
-        if (failed_ || size > rest_.size()) {
-            failed_ = true;
+        if (!offers(size)) {
             return {};
         }
         const std::string_view taken = rest_.substr(0, size);
@@ -132,20 +160,20 @@ ChannelDescription takeChannel(Cursor& cursor) {
     channel.name = cursor.text();
     channel.unit = cursor.optionalText();
     const std::size_t parts = cursor.number<std::uint16_t>();
-    if (channel.format == HwStatsFormat::Histogram && (parts + 1) * sizeof(std::int64_t) <= cursor.rest()) {
+    if (channel.format == HwStatsFormat::Histogram && cursor.offers((parts + 1) * sizeof(std::int64_t))) {
         channel.bounds.resize(parts + 1);
         for (std::int64_t& bound : channel.bounds) {
             bound = cursor.number<std::int64_t>();
         }
     }
-    if (channel.format == HwStatsFormat::State && parts * sizeof(std::uint16_t) <= cursor.rest()) {
+    if (channel.format == HwStatsFormat::State && cursor.offers(parts * sizeof(std::uint16_t))) {
         channel.states.resize(parts);
         for (std::string& state : channel.states) {
             state = cursor.text();
         }
     }
     if (channel.parts() != parts) {
-        channel.format = HwStatsFormat::None; // parts that its format does not have, or that are not there
+        channel.format = HwStatsFormat::None; // parts that its format does not have
     }
     return channel;
 }
@@ -193,9 +221,10 @@ Result<std::shared_ptr<const ChannelTable>> decodeDescription(std::string_view d
     table->driverName = cursor.optionalText();
     table->group = cursor.optionalText();
     table->subGroup = cursor.optionalText();
+    table->channels.reserve(std::min<std::size_t>(channelCount, description.size() / kLeastChannelBytes));
     for (std::uint32_t i = 0; i < channelCount && !cursor.failed(); ++i) {
-        table->channels.push_back(takeChannel(cursor));
-        if (std::string fault = faultOf(table->channels.back()); !fault.empty()) {
+        const ChannelDescription& channel = table->channels.emplace_back(takeChannel(cursor));
+        if (std::string fault = cursor.failed() ? "" : faultOf(channel); !fault.empty()) {
             return refused("channel " + std::to_string(i) + ": " + fault);
         }
     }

@@ -25,8 +25,8 @@ std::string refusalOf(const std::string& description, std::uint32_t channels) {
 ChannelTable tableOf(ChannelDescription channel) { return {"d", "g", std::nullopt, {std::move(channel)}}; }
 
 constexpr const char* kNoHistogram = "a histogram has 1 to 512 buckets with rising bounds";
-constexpr const char* kNoStates = "a state channel has 1 to 512 states with names";
-constexpr const char* kNoName = "a channel's name or unit is empty, too long or no text";
+constexpr const char* kStrange = "a channel is of no known format or has parts that do not suit it";
+constexpr const char* kCut = "its description ends too early";
 
 TEST(ChannelFileFormatTest, ADescriptionIsReadBack) {
     const ChannelTable table = exampleTable();
@@ -58,25 +58,54 @@ TEST(ChannelFileFormatTest, TheLayoutIsThatOfTheDocument) {
     EXPECT_EQ(valuesBytes(table), 320U);
 }
 
-TEST(ChannelFileFormatTest, WhatCannotBePublishedIsRefusedInWords) {
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Simple, "", {}, {}, {}})), kNoName);
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Simple, std::string(257, 'x'), {}, {}, {}})), kNoName);
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Simple, "line\nend", {}, {}, {}})), kNoName);
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Simple, "\xFF", {}, {}, {}})), kNoName);
+TEST(ChannelFileFormatTest, ANameThatCannotBeIsRefusedInWords) {
+    const auto named = [](const std::string& name) {
+        return refusalOf(tableOf({HwStatsFormat::Simple, name, {}, {}, {}}));
+    };
+    EXPECT_EQ(named(""), "a channel's name is empty");
+    EXPECT_EQ(named(std::string(256, 'x')), "");
+    EXPECT_EQ(named(std::string(257, 'x')), "a channel's name has 257 bytes, more than 256");
+    EXPECT_EQ(named("line\nend"), "a channel's name has control characters");
+    EXPECT_EQ(named("\x7F"), "a channel's name has control characters");
+    EXPECT_EQ(named("\xFF"), "a channel's name is no UTF-8");
+}
+
+TEST(ChannelFileFormatTest, AUnitThatCannotBeIsRefusedInWords) {
+    const auto measured = [](const std::string& unit) {
+        return refusalOf(tableOf({HwStatsFormat::Simple, "x", unit, {}, {}}));
+    };
+    EXPECT_EQ(measured(""), "");
+    EXPECT_EQ(measured(std::string(300, 'x')), "a channel's unit has 300 bytes, more than 256");
+    EXPECT_EQ(measured("\t"), "a channel's unit has control characters");
+    EXPECT_EQ(measured("\xC0"), "a channel's unit is no UTF-8");
+}
+
+TEST(ChannelFileFormatTest, ADriverThatCannotBeIsRefusedInWords) {
+    const auto channels = exampleTable().channels;
+    EXPECT_EQ(refusalOf(ChannelTable{"", "g", {}, channels}), "the driver's name is empty");
+    EXPECT_EQ(refusalOf(ChannelTable{std::string(257, 'x'), "g", {}, channels}),
+              "the driver's name has 257 bytes, more than 256");
+    EXPECT_EQ(refusalOf(ChannelTable{"d", "", {}, channels}), "the group is empty");
+    EXPECT_EQ(refusalOf(ChannelTable{"d", "g", "\n", channels}), "the subgroup has control characters");
+    EXPECT_EQ(refusalOf(ChannelTable{"d", "g", {}, {}}), "a driver has 1 to 4096 channels");
+}
+
+TEST(ChannelFileFormatTest, PartsThatCannotBeAreRefusedInWords) {
     EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Simple, "x", {}, {1, 2}, {}})),
               "a counter has neither buckets nor states");
     EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Histogram, "x", {}, {}, {}})), kNoHistogram);
     EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Histogram, "x", {}, {1}, {}})), kNoHistogram);
     EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Histogram, "x", {}, {1, 1}, {}})), kNoHistogram);
     EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Histogram, "x", {}, {2, 1}, {}})), kNoHistogram);
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {}, {}})), kNoStates);
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {}, {"a", ""}})), kNoStates);
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {}, std::vector<std::string>(513, "s")})), kNoStates);
-    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::SimpleArray, "x", {}, {}, {}})),
-              "a channel is of no known format or has parts that do not suit it");
-    EXPECT_EQ(refusalOf(ChannelTable{"d", "g", {}, {}}), "a driver has 1 to 4096 channels");
-    EXPECT_EQ(refusalOf(ChannelTable{"d", "", {}, exampleTable().channels}),
-              "the driver's name or a group is empty, too long or no text");
+    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::Histogram, "x", {}, {1, 2}, {"a"}})), kStrange);
+    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {}, {}})), "a state channel has 1 to 512 states");
+    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {}, std::vector<std::string>(513, "s")})),
+              "a state channel has 1 to 512 states");
+    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {}, {"a", ""}})), "a state's name is empty");
+    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {}, {"a", std::string(257, 's')}})),
+              "a state's name has 257 bytes, more than 256");
+    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::State, "x", {}, {1, 2}, {"a"}})), kStrange);
+    EXPECT_EQ(refusalOf(tableOf({HwStatsFormat::SimpleArray, "x", {}, {}, {}})), kStrange);
 }
 
 TEST(ChannelFileFormatTest, AFileThatWouldBeTooLargeIsRefused) {
@@ -92,17 +121,23 @@ TEST(ChannelFileFormatTest, ADescriptionEndsWhereItsChannelsEnd) {
     const std::string description = *encodeDescription(exampleTable());
     EXPECT_EQ(refusalOf(description, 3), "");
     EXPECT_EQ(refusalOf(description, 2), "its description is too long");
-    EXPECT_NE(refusalOf(description, 4), "");
+    EXPECT_EQ(refusalOf(description, 4), kCut);
     EXPECT_EQ(refusalOf(description + "x", 3), "its description is too long");
     for (std::size_t size = 0; size < description.size(); ++size) {
-        EXPECT_NE(refusalOf(description.substr(0, size), 3), "") << size;
+        EXPECT_EQ(refusalOf(description.substr(0, size), 3), kCut) << size;
     }
 }
 
 TEST(ChannelFileFormatTest, CountsThatAreNotThereCostNothing) {
     std::string description = *encodeDescription(tableOf({HwStatsFormat::Histogram, "x", {}, {1, 2}, {}}));
     putAt(description, description.size() - 18, std::uint16_t{0xFFFF});
-    EXPECT_EQ(refusalOf(description, 1), "channel 0: a channel is of no known format or has parts that do not suit it");
+    EXPECT_EQ(refusalOf(description, 1), kCut);
+}
+
+TEST(ChannelFileFormatTest, AWrongChannelIsNamedByItsNumber) {
+    std::string description = *encodeDescription(exampleTable());
+    description[description.find("busy")] = '\xFF';
+    EXPECT_EQ(refusalOf(description, 3), "channel 1: a channel's name is no UTF-8");
 }
 
 TEST(ChannelFileFormatTest, AHeaderIsChecked) {

@@ -1,5 +1,6 @@
 #include "platform/hwstats/ChannelFolder.h"
 
+#include "common/SettingValues.h"
 #include "platform/hwstats/ChannelFileNames.h"
 
 #include <algorithm>
@@ -31,6 +32,19 @@ bool isUntouched(const struct stat& one, const struct stat& other) {
 bool isSameDescription(const ChannelFileHeader& one, const ChannelFileHeader& other) {
     return one.generation == other.generation && one.fileBytes == other.fileBytes &&
            one.channelCount == other.channelCount && one.descriptionBytes == other.descriptionBytes;
+}
+
+/// What a table takes up in memory, but for what the allocator adds.
+std::size_t bytesOf(const ChannelTable& table) {
+    std::size_t bytes = sizeof(table);
+    for (const ChannelDescription& channel : table.channels) {
+        bytes += sizeof(channel) + channel.name.size() + channel.unit.value_or("").size() +
+                 channel.bounds.size() * sizeof(std::int64_t);
+        for (const std::string& state : channel.states) {
+            bytes += sizeof(state) + state.size();
+        }
+    }
+    return bytes;
 }
 
 template <class Count>
@@ -90,26 +104,57 @@ bool ChannelFolder::listFiles(Samples& samples) {
 
 const ChannelFolder::Known* ChannelFolder::learn(const std::string& name, ByteSource& file, const struct stat& status,
                                                  Budget& budget) {
-    const auto found = known_.find(name);
-    if (found != known_.end() && found->second.table == nullptr && isUntouched(found->second.status, status)) {
-        return &found->second;
+    Known& known = known_[name];
+    if (known.tableBytes == 0 && isUntouched(known.status, status)) {
+        return &known; // refused
     }
     const auto header = readChannelFileHeader(file, static_cast<std::uint64_t>(status.st_size));
-    if (header && found != known_.end() && found->second.table != nullptr && isSameFile(found->second.status, status) &&
-        isSameDescription(found->second.header, *header)) {
-        found->second.header = *header;
-        return &found->second;
+    const bool isSame =
+        header && known.tableBytes > 0 && isSameFile(known.status, status) && isSameDescription(known.header, *header);
+    if (isSame && (known.table != nullptr || known.tableBytes > room())) {
+        known.header = *header;
+        return &known;
     }
     if (header && !spend(budget.bytes, header->descriptionBytes)) {
         return nullptr;
     }
-    Known known{status, {}, nullptr};
+    known = {status, header ? *header : ChannelFileHeader(), nullptr, 0, std::move(known.fault)};
     if (header) {
-        auto table = readChannelTable(file, *header);
-        known.header = *header;
-        known.table = table ? *std::move(table) : nullptr;
+        readTable(name, file, known);
+    } else {
+        refuse(name, known, header.failure().description);
     }
-    return &known_.insert_or_assign(name, std::move(known)).first->second;
+    return &known;
+}
+
+void ChannelFolder::readTable(const std::string& name, ByteSource& file, Known& known) {
+    auto table = readChannelTable(file, known.header);
+    if (!table) {
+        refuse(name, known, table.failure().description);
+        return;
+    }
+    known.tableBytes = bytesOf(**table);
+    if (known.tableBytes > room()) {
+        refuse(name, known, "the channels of all files take up more than " + std::to_string(kMostKeptBytes) + " bytes");
+        return;
+    }
+    known.table = *std::move(table);
+    known.fault.clear();
+}
+
+void ChannelFolder::refuse(const std::string& name, Known& known, const std::string& fault) {
+    if (known.fault != fault) {
+        known.fault = fault;
+        faults_.push_back(escapedText(name) + ": " + fault);
+    }
+}
+
+std::size_t ChannelFolder::room() const {
+    std::size_t kept = 0;
+    for (const auto& [name, known] : known_) {
+        kept += known.table == nullptr ? 0 : known.tableBytes;
+    }
+    return kMostKeptBytes - kept;
 }
 
 bool ChannelFolder::sampleFile(const std::string& name, const Wanted& wanted, Budget& budget, Samples& samples) {

@@ -14,6 +14,7 @@
 #include <optional>
 #include <string>
 #include <sys/stat.h>
+#include <utility>
 #include <vector>
 
 namespace vela::platform::hwstats {
@@ -24,6 +25,8 @@ public:
     static constexpr std::size_t kMostFiles = 256;
     static constexpr std::size_t kMostBytes = std::size_t{16} * 1024 * 1024;
     static constexpr std::size_t kMostSampledChannels = 16'384;
+    /// What the descriptions of all files may take up in memory, between samplings too.
+    static constexpr std::size_t kMostKeptBytes = std::size_t{16} * 1024 * 1024;
 
     explicit ChannelFolder(std::string path) : path_(std::move(path)) {}
 
@@ -33,12 +36,17 @@ public:
     /// cannot be read.
     std::optional<int> sample(const Wanted& wanted, Samples& samples);
 
+    /// Why files gave nothing, for a person. Each reason of a file is told once, as long as it does not change.
+    std::vector<std::string> takeFaults() { return std::exchange(faults_, {}); }
+
 private:
-    /// What is known of a file. Without a table it is refused as it stands.
+    /// What is known of a file. Without a table it is refused as it stands, or there was no room for its table.
     struct Known {
         struct stat status {};
         ChannelFileHeader header;
         std::shared_ptr<const ChannelTable> table;
+        std::size_t tableBytes = 0; ///< of the table, also of one that there was no room for
+        std::string fault;          ///< as it was told
     };
     /// What one sampling may still spend.
     struct Budget {
@@ -49,11 +57,16 @@ private:
     bool listFiles(Samples& samples);
     bool sampleFile(const std::string& name, const Wanted& wanted, Budget& budget, Samples& samples);
     const Known* learn(const std::string& name, ByteSource& file, const struct stat& status, Budget& budget);
+    void readTable(const std::string& name, ByteSource& file, Known& known);
+    void refuse(const std::string& name, Known& known, const std::string& fault);
+    /// In memory, for the tables of further files.
+    std::size_t room() const;
 
     const std::string path_;
     FileDescriptor folder_; ///< during a sampling
     std::vector<std::string> names_;
     std::map<std::string, Known, std::less<>> known_;
+    std::vector<std::string> faults_; ///< that nobody has taken yet
 };
 
 } // namespace vela::platform::hwstats

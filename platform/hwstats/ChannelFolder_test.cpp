@@ -133,6 +133,35 @@ TEST_F(ChannelFolderTest, AFileThatWasMendedIsReadAnew) {
     EXPECT_THAT(keys(), ElementsAre("file:a.channels"));
 }
 
+TEST_F(ChannelFolderTest, WhatIsWrongWithAFileIsToldOnce) {
+    const std::string bytes = fileOf(exampleTable());
+    write("empty.channels", "");
+    write("good.channels", bytes);
+    write("short.channels", bytes.substr(0, bytes.size() - 1));
+    sample();
+    EXPECT_THAT(folder_.takeFaults(), ElementsAre("empty.channels: it is shorter than a header",
+                                                  "short.channels: it is shorter than it says"));
+    sample();
+    EXPECT_THAT(folder_.takeFaults(), IsEmpty());
+}
+
+TEST_F(ChannelFolderTest, AFileIsToldAgainWhenSomethingElseIsWrong) {
+    std::string bytes = fileOf(exampleTable());
+    putAt(bytes, 12, std::uint32_t{2});
+    write("a.channels", bytes);
+    sample();
+    EXPECT_THAT(folder_.takeFaults(), ElementsAre("a.channels: its version is 2, not 1"));
+    write("a.channels", bytes + "more");
+    sample();
+    EXPECT_THAT(folder_.takeFaults(), IsEmpty()) << "the same fault of another file";
+    putAt(bytes, 12, kChannelFileVersion);
+    bytes[bytes.find("frames")] = '\xFF';
+    write("a.channels", bytes);
+    const Samples samples = sample();
+    EXPECT_THAT(folder_.takeFaults(), ElementsAre("a.channels: channel 0: a channel's name is no UTF-8"));
+    EXPECT_THAT(samples.missed, ElementsAre("file:a.channels"));
+}
+
 TEST_F(ChannelFolderTest, AFileThatShrinksUnderItsPublisherIsMissed) {
     write("a.channels", fileOf(exampleTable()));
     ASSERT_EQ(keys().size(), 1U);
@@ -162,6 +191,31 @@ TEST_F(ChannelFolderTest, ChannelsBeyondTheBoundAreMissed) {
     const Samples samples = sample();
     EXPECT_EQ(samples.blocks.size(), 4U);
     EXPECT_THAT(samples.missed, UnorderedElementsAre("file:e.channels"));
+}
+
+TEST_F(ChannelFolderTest, TablesBeyondTheBoundOfMemoryAreMissed) {
+    // In memory 1.5 MiB and a little: ten fit.
+    const ChannelDescription counter{HwStatsFormat::Simple, std::string(256, 'x'), {}, {}, {}};
+    const ChannelTable large{"d", "other", {}, std::vector<ChannelDescription>(4'096, counter)};
+    const std::string bytes = fileOf(large);
+    for (const char* name : {"b", "c", "d", "e", "f", "g", "h", "i", "j", "k", "l"}) {
+        write(std::string(name) + ".channels", bytes);
+    }
+    const auto sampleSpeaker = [this] {
+        Samples samples;
+        folder_.sample([](const ChannelTable& table) { return table.group == "Speaker"; }, samples);
+        return samples;
+    };
+    constexpr const char* kFault = "l.channels: the channels of all files take up more than 16777216 bytes";
+    EXPECT_THAT(sampleSpeaker().missed, ElementsAre("file:l.channels"));
+    EXPECT_THAT(folder_.takeFaults(), ElementsAre(kFault));
+    write("a.channels", fileOf(exampleTable()));
+    const Samples small = sampleSpeaker();
+    EXPECT_EQ(small.blocks.size(), 1U) << "there is room for a small one";
+    EXPECT_THAT(small.missed, ElementsAre("file:l.channels"));
+    EXPECT_THAT(folder_.takeFaults(), IsEmpty());
+    std::filesystem::remove(path_ / "b.channels");
+    EXPECT_THAT(sampleSpeaker().missed, IsEmpty());
 }
 
 } // namespace

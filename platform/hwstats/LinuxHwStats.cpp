@@ -1,5 +1,6 @@
 #include "platform/hwstats/LinuxHwStats.h"
 
+#include "common/SettingValues.h"
 #include "common/VelaReportingLogCategories.h"
 #include "platform/hwstats/ChannelFileNames.h"
 
@@ -25,6 +26,8 @@ bool isOf(const Part& part, const Part& wanted) { return !wanted || part == want
 bool isOf(const Part& group, const Part& subGroup, const HwStatsGroupName& name) {
     return isOf(group, name.group) && isOf(subGroup, name.subGroup);
 }
+
+void logFault(const std::string& fault) { VelaReportingDriverUtilityCategory().error("%@", fault); }
 
 } // namespace
 
@@ -56,6 +59,8 @@ LinuxHwStatsOptions hwStatsOptionsOf(const Settings& settings) {
 
 LinuxHwStats::LinuxHwStats(LinuxHwStatsOptions options, const Clock& clock)
     : clock_(clock),
+      channelFolder_(options.channelFolder),
+      complain_(options.complain ? std::move(options.complain) : std::function(logFault)),
       folder_(std::move(options.channelFolder)),
       systemWait_(options.systemWait),
       sampler_(std::move(options.systemRoot), clock) {
@@ -118,23 +123,21 @@ HwStatsAnswer<HwStatsSamples> LinuxHwStats::createSamples(const HwStatsSubscript
     if (channels == nullptr || dynamic_cast<const Subscription*>(&subscription) == nullptr) {
         return {nullptr, HwStatsError{kStrangeObject}};
     }
-    const HwStatsGroupName& wanted = channels->name;
+    std::vector<std::string> faults;
+    HwStatsAnswer<HwStatsSamples> answer = sample(channels->name, faults);
+    for (const std::string& fault : faults) {
+        complain_(fault);
+    }
+    return answer;
+}
+
+HwStatsAnswer<HwStatsSamples> LinuxHwStats::sample(const HwStatsGroupName& wanted, std::vector<std::string>& faults) {
     auto samples = std::make_shared<Samples>();
     std::optional<HwStatsError> error;
     const MutexLock lock(mutex_);
     samples->time = static_cast<std::uint64_t>(clock_.monotonicNow().time_since_epoch().count());
     const std::vector<const Group*> groups = groupsFor(wanted);
-    std::vector<hwstats::SystemSource*> sources;
-    for (const Group* group : groups) {
-        for (std::size_t i = 0; group->givesSources(wanted) && i < group->sources.size(); ++i) {
-            sources.push_back(group->sources[i].get());
-        }
-    }
-    if (!sources.empty() && !sampler_.sample(sources, *samples, systemWait_)) {
-        VelaReportingDriverUtilityCategory().error(
-            "the system's numbers for driver %@-%@ were not read within %lli ms: left out of this sampling",
-            wanted.group, wanted.subGroup, systemWait_.count());
-    }
+    sampleSystem(groups, wanted, *samples, faults);
     if (std::ranges::any_of(groups, [&](const Group* group) { return group->mayGiveFiles(wanted); })) {
         const auto isWanted = [&](const ChannelTable& table) {
             return isOf(table.group, table.subGroup, wanted) &&
@@ -146,9 +149,30 @@ HwStatsAnswer<HwStatsSamples> LinuxHwStats::createSamples(const HwStatsSubscript
             error = HwStatsError{*code};
             samples->incomplete = true;
         }
+        for (const std::string& fault : folder_.takeFaults()) {
+            faults.push_back(escapedText(channelFolder_) + "/" + fault);
+        }
     }
     hwstats::addSuffixes(*samples);
     return {std::move(samples), error};
+}
+
+/// A start samples many drivers one after another. When one has waited for a file of the kernel that does not answer,
+/// the others do not wait for it again: nothing is waited for, or logged, until that reading has ended.
+void LinuxHwStats::sampleSystem(const std::vector<const Group*>& groups, const HwStatsGroupName& wanted,
+                                Samples& samples, std::vector<std::string>& faults) {
+    std::vector<hwstats::SystemSource*> sources;
+    for (const Group* group : groups) {
+        for (std::size_t i = 0; group->givesSources(wanted) && i < group->sources.size(); ++i) {
+            sources.push_back(group->sources[i].get());
+        }
+    }
+    if (sources.empty() || sampler_.isBusy() || sampler_.sample(sources, samples, systemWait_)) {
+        return;
+    }
+    faults.push_back("the system's numbers for driver " + wanted.group.value_or("") + "-" +
+                     wanted.subGroup.value_or("") + " were not read within " + std::to_string(systemWait_.count()) +
+                     " ms: until they are, samplings are without any");
 }
 
 HwStatsAnswer<HwStatsSamples> LinuxHwStats::createSamplesDelta(const HwStatsSamples* previous,

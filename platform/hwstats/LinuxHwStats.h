@@ -3,7 +3,8 @@
 // each source that stands for all that the source will have: who is there is looked up at each sampling.
 //
 // Thread-safe: one sampling at a time. Samplings read a bounded number of files within a bounded time: numbers of the
-// kernel that take longer are left out, and logged. Its objects may outlive it.
+// kernel that take longer are left out, and logged; until they have come nobody waits for any. Its objects may outlive
+// it.
 #pragma once
 
 #include "platform/Clock.h"
@@ -17,6 +18,7 @@
 #include <cerrno>
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -30,6 +32,9 @@ struct LinuxHwStatsOptions {
     std::string systemRoot;           ///< where /proc and /sys stand: "" for this machine's own
     std::vector<HwStatsGroup> groups; ///< every group that may be asked for
     std::chrono::milliseconds systemWait = hwstats::SystemSampler::kMostWait; ///< the longest wait for /proc and /sys
+    /// Takes what is left out of samplings and why, each a line and once, on the thread that samples; without it, the
+    /// log does.
+    std::function<void(const std::string& fault)> complain{};
 };
 
 /// Those of a service with these settings.
@@ -67,8 +72,14 @@ private:
 
     /// The group of that very name; without one, all.
     std::vector<const Group*> groupsFor(const HwStatsGroupName& wanted) const VELA_REQUIRES(mutex_);
+    HwStatsAnswer<HwStatsSamples> sample(const HwStatsGroupName& wanted, std::vector<std::string>& faults)
+        VELA_EXCLUDES(mutex_);
+    void sampleSystem(const std::vector<const Group*>& groups, const HwStatsGroupName& wanted,
+                      hwstats::Samples& samples, std::vector<std::string>& faults) VELA_REQUIRES(mutex_);
 
     const Clock& clock_;
+    const std::string channelFolder_;
+    const std::function<void(const std::string&)> complain_;
     Mutex mutex_;
     hwstats::ChannelFolder folder_ VELA_GUARDED_BY(mutex_);
     /// The groups stay; their sources are used by the sampler alone.

@@ -48,6 +48,11 @@ bool SystemSampler::sample(const std::vector<SystemSource*>& sources, Samples& s
     return true;
 }
 
+bool SystemSampler::isBusy() {
+    const std::lock_guard lock(mutex_);
+    return reading_ != nullptr;
+}
+
 /// Answers whether there is a thread to read.
 bool SystemSampler::begin() {
     if (!thread_.joinable()) {

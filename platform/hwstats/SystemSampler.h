@@ -33,6 +33,10 @@ public:
     bool sample(const std::vector<SystemSource*>& sources, Samples& samples,
                 std::chrono::milliseconds wait = kMostWait);
 
+    /// Whether a reading is under way. Between samplings that is one that took too long, and whoever waits for it waits
+    /// in vain, as a rule.
+    bool isBusy();
+
 private:
     struct Reading {
         std::vector<SystemSource*> sources;

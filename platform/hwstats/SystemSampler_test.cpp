@@ -108,6 +108,19 @@ TEST_F(SystemSamplerTest, AfterAStuckReadingHasEndedSamplingsWorkAgain) {
     EXPECT_THAT(keysOf(samples_), ElementsAre("one"));
 }
 
+TEST_F(SystemSamplerTest, IsBusyWhileAReadingIsOverdue) {
+    StuckSource stuck;
+    SystemSampler sampler("", clock_);
+    EXPECT_FALSE(sampler.isBusy());
+    EXPECT_TRUE(sampler.sample({&one_}, samples_, 60s));
+    EXPECT_FALSE(sampler.isBusy());
+    EXPECT_FALSE(sampler.sample({&stuck}, samples_, 1ms));
+    EXPECT_TRUE(sampler.isBusy());
+    stuck.release();
+    EXPECT_TRUE(sampler.sample({&two_}, samples_, 60s));
+    EXPECT_FALSE(sampler.isBusy());
+}
+
 TEST_F(SystemSamplerTest, WithoutAnySamplingThereIsNoThreadToEnd) { const SystemSampler sampler("", clock_); }
 
 } // namespace

@@ -84,6 +84,7 @@ bool GraphModel::isLeftOut(const NodeProperties& node, const std::string& applic
 SessionPlan GraphModel::planFor(const Node& node, const std::string& application) const {
     SessionPlan plan;
     plan.isCapture = node.kind == NodeKind::CaptureStream || node.kind == NodeKind::Source;
+    plan.isDevice = isDevice(node.kind);
     plan.hasStatistics = cyclesSince_.has_value();
     plan.description.reporterID = base_ + static_cast<std::int64_t>(node.properties.serial);
     plan.description.serviceType = serviceTypeOf(node.properties);

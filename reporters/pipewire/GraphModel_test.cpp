@@ -108,6 +108,18 @@ TEST_F(GraphModelTest, DevicesHaveSessionsWhenTheRulesAskForThem) {
                             HasSubstr("Output/State"), HasSubstr("Volume/State"), HasSubstr("Playback/Start")));
 }
 
+TEST_F(GraphModelTest, ADeviceThatRestsIsNoError) {
+    ReportingRules rules;
+    rules.devices = true;
+    GraphModel graph = model(rules);
+    graph.addNode(kSpeaker, node("Audio/Sink", "speaker", 1), at(0));
+    graph.addNode(40, node("Audio/Source", "microphone", 3), at(0));
+    graph.setNodeState(kSpeaker, NodeState::Suspended, "", at(10));
+    passTime(graph, 60000);
+    EXPECT_THAT(reports.takeWith("Error"), IsEmpty());
+    EXPECT_FALSE(graph.deadline());
+}
+
 TEST_F(GraphModelTest, TheApplicationIsTheNodesOrItsClientsOrTheNodesName) {
     GraphModel graph = model();
     graph.setClient(20, "Client");

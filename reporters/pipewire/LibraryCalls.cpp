@@ -70,7 +70,9 @@ bool LibraryCalls::destroySession(std::int64_t reporterID) {
 
 bool LibraryCalls::stopSession(std::int64_t reporterID, std::chrono::milliseconds timeout) {
     const Status status = client_.stopReportingSessionForID(reporterID, timeout);
-    return status == VelaReportingStatusOk || status == VelaReportingStatusRefused;
+    // Whatever it answered, in whatever form.
+    return status == VelaReportingStatusOk || status == VelaReportingStatusRefused ||
+           status == VelaReportingStatusProtocolError;
 }
 
 } // namespace vela::reporter

@@ -23,6 +23,9 @@ std::optional<std::string> NamePolicy::apply(const std::string& application) con
     case NameTreatment::Report:
         return application;
     case NameTreatment::Hash: {
+        if (secret_.empty()) {
+            return std::nullopt;
+        }
         // The outer hash keeps a secret of known length from being continued by a chosen name.
         const std::string hash = sha256(secret_ + '\0' + sha256(secret_ + '\0' + application));
         return hash.empty() ? std::nullopt : std::optional("app-" + hash.substr(0, kDigits));
@@ -31,6 +34,15 @@ std::optional<std::string> NamePolicy::apply(const std::string& application) con
         break;
     }
     return std::nullopt;
+}
+
+std::string deviceSecretOf(std::string_view machineID) {
+    constexpr std::size_t kIDDigits = 32;
+    const std::string_view digits = machineID.substr(0, machineID.find('\n'));
+    const bool isID = digits.size() == kIDDigits && machineID.size() <= kIDDigits + 1 &&
+                      digits.find_first_not_of("0123456789abcdefABCDEF") == std::string_view::npos &&
+                      digits.find_first_not_of('0') != std::string_view::npos;
+    return isID ? std::string(machineID) : std::string();
 }
 
 } // namespace vela::reporter

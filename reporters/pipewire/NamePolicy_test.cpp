@@ -42,5 +42,23 @@ TEST(NamePolicyTest, HashesDifferBetweenDevices) {
               NamePolicy(NameTreatment::Hash, "other").apply("Player"));
 }
 
+TEST(NamePolicyTest, NamesThatCannotBeHashedSecretlyAreLeftOut) {
+    EXPECT_EQ(NamePolicy(NameTreatment::Hash, "").apply("Player"), std::nullopt);
+    EXPECT_EQ(NamePolicy(NameTreatment::Report, "").apply("Player"), "Player");
+}
+
+TEST(DeviceSecretTest, IsTheMachinesID) {
+    EXPECT_EQ(deviceSecretOf("0123456789abcdef0123456789ABCDEF\n"), "0123456789abcdef0123456789ABCDEF\n");
+    EXPECT_EQ(deviceSecretOf("0123456789abcdef0123456789ABCDEF"), "0123456789abcdef0123456789ABCDEF");
+}
+
+TEST(DeviceSecretTest, WhatIsNoIDIsNoSecret) {
+    for (const char* const text : {"", "\n", "uninitialized\n", "00000000000000000000000000000000\n",
+                                   "0123456789abcdef0123456789abcde\n", "0123456789abcdef0123456789abcdef0\n",
+                                   "0123456789abcdef0123456789abcdeg\n", "0123456789abcdef0123456789abcdef\n\n"}) {
+        EXPECT_EQ(deviceSecretOf(text), "") << text;
+    }
+}
+
 } // namespace
 } // namespace vela::reporter

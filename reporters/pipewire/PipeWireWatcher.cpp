@@ -1,5 +1,6 @@
 #include "reporters/pipewire/PipeWireWatcher.h"
 
+#include "reporters/pipewire/ConnectionPauses.h"
 #include "reporters/pipewire/ServerConnection.h"
 #include "reporters/pipewire/SocketWatch.h"
 
@@ -22,10 +23,6 @@ namespace vela::reporter {
 namespace {
 
 using std::chrono::nanoseconds;
-
-constexpr std::chrono::milliseconds kFirstPause{50};
-/// Where the socket is watched, nothing is tried after this pause: a server that comes makes its socket anew.
-constexpr std::chrono::milliseconds kLongestPause{5000};
 
 constexpr long kNanosecondsPerSecond = 1'000'000'000;
 
@@ -66,7 +63,7 @@ struct PipeWireWatcher::Loop final : ServerConnectionOwner {
 
     bool setUp();
     void connect();
-    void scheduleConnect();
+    void connectAfter(std::chrono::milliseconds pause);
     void dropConnection();
 
     const WatcherOptions& options;
@@ -81,7 +78,7 @@ struct PipeWireWatcher::Loop final : ServerConnectionOwner {
     std::optional<SocketWatch> socketWatch;
     std::unique_ptr<ServerConnection> connection;
     std::optional<nanoseconds> armed;
-    std::chrono::milliseconds pause = kFirstPause;
+    ConnectionPauses pauses;
     bool isWaitingTold = false;
 };
 
@@ -135,7 +132,7 @@ bool PipeWireWatcher::Loop::setUp() {
             [](void* data, int /*descriptor*/, std::uint32_t /*mask*/) {
                 auto* const self = static_cast<Loop*>(data);
                 if (self->socketWatch->hasCome() && !self->connection) {
-                    self->pause = kFirstPause;
+                    self->pauses.reset();
                     self->connect();
                 }
             },
@@ -155,11 +152,13 @@ void PipeWireWatcher::Loop::connect() {
         if (!std::exchange(isWaitingTold, true)) {
             tell(std::string("waiting for an audio server: ") + std::strerror(errno)); // NOLINT(concurrency-mt-unsafe)
         }
-        scheduleConnect();
+        if (const auto pause = pauses.attemptFailed(socketWatch->descriptor() >= 0)) {
+            connectAfter(*pause);
+        }
         return;
     }
     isWaitingTold = false;
-    pause = kFirstPause;
+    pauses.connected(momentNow().monotonic);
     graph.connected(newReporterIDBase());
     connection = std::make_unique<ServerConnection>(*this, core);
     if (connection->isLost()) {
@@ -169,13 +168,9 @@ void PipeWireWatcher::Loop::connect() {
     tell("connected to the audio server");
 }
 
-void PipeWireWatcher::Loop::scheduleConnect() {
-    if (pause >= kLongestPause && socketWatch->descriptor() >= 0) {
-        return;
-    }
+void PipeWireWatcher::Loop::connectAfter(std::chrono::milliseconds pause) {
     timespec value = timespecOf(pause);
     pw_loop_update_timer(loop, connectTimer, &value, nullptr, false);
-    pause = std::min(pause * 2, kLongestPause);
 }
 
 /// The connection cannot be destroyed in a call of its own.
@@ -185,7 +180,7 @@ void PipeWireWatcher::Loop::dropConnection() {
     if (connection) {
         tell("the connection to the audio server is lost");
         connection.reset();
-        scheduleConnect();
+        connectAfter(pauses.connectionLost(momentNow().monotonic));
     }
 }
 

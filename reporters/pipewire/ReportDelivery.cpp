@@ -68,7 +68,7 @@ bool ReportDelivery::perform(const StopCall& call) {
     if (session == nullptr || !session->isStarted) {
         return true;
     }
-    if (!service_.isConnected() || !(session->isToRepeat ? repeatRun(*session) : repeatConditions(*session))) {
+    if (!service_.isConnected() || !prepareStop(*session)) {
         return false;
     }
     session->isToRepeat =
@@ -87,6 +87,15 @@ bool ReportDelivery::perform(const DestroyCall& call) {
     }
     sessions_.erase(call.reporterID);
     return true;
+}
+
+/// On its own connection a stop that was not answered is only late: the service handles it, and answers the next one
+/// behind it. To tell the run again would deliver it twice.
+bool ReportDelivery::prepareStop(Session& session) {
+    if (!session.isToRepeat) {
+        return repeatConditions(session);
+    }
+    return service_.connections() == session.connection || repeatRun(session);
 }
 
 /// To a service that was started since: it has the session, started, without what was said.

@@ -48,7 +48,7 @@ private:
     struct Session {
         SessionDescription description;
         bool isStarted = false;
-        bool isToRepeat = false;         ///< whether its stop was not answered
+        bool isToRepeat = false;         ///< whether its stop was not answered: to another service all is told again
         std::uint64_t connection = 0;    ///< that the run was told on
         std::deque<Report> conditions{}; ///< of the run
     };
@@ -59,6 +59,7 @@ private:
     bool perform(const StopCall& call);
     bool perform(const DestroyCall& call);
     Session* findSession(std::int64_t reporterID);
+    bool prepareStop(Session& session);
     bool repeatConditions(Session& session);
     bool repeatRun(Session& session);
     static void keep(Session& session, const Report& report);

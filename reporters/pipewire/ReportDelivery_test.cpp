@@ -30,6 +30,10 @@ public:
     bool destroySession(std::int64_t reporterID) override { return add("destroy", reporterID); }
     bool stopSession(std::int64_t reporterID, std::chrono::milliseconds /*timeout*/) override {
         add("stop", reporterID);
+        if (lateStops > 0) {
+            --lateStops;
+            return false;
+        }
         if (unansweredStops > 0) {
             --unansweredStops;
             restart();
@@ -46,7 +50,8 @@ public:
     std::atomic<bool> isThere = true;
     std::atomic<bool> isFull = false;
     std::atomic<std::uint64_t> times = 1;
-    std::atomic<int> unansweredStops = 0;
+    std::atomic<int> lateStops = 0;       ///< that are handled, and answered too late
+    std::atomic<int> unansweredStops = 0; ///< in which the service ends, and comes again
 
 private:
     bool add(const std::string& line, std::int64_t reporterID) {
@@ -129,6 +134,47 @@ TEST_F(ReportDeliveryTest, AStopThatIsNotAnsweredRepeatsTheWholeRun) {
     EXPECT_TRUE(perform({StopCall{7}}));
     EXPECT_THAT(service.take(),
                 ElementsAre("stop 7", "stop 7", "create 7", "start 7", "send 1 7", "send 2 7", "stop 7"));
+}
+
+TEST_F(ReportDeliveryTest, AStopThatIsAnsweredTooLateIsMadeAgainAlone) {
+    perform({create(), StartCall{7}, condition(1)});
+    service.take();
+    service.lateStops = 1;
+    EXPECT_FALSE(perform({StopCall{7}}));
+    EXPECT_TRUE(perform({StopCall{7}}));
+    EXPECT_THAT(service.take(), ElementsAre("stop 7", "stop 7"));
+}
+
+TEST_F(ReportDeliveryTest, AServiceThatIsAlwaysTooLateIsNotToldTheRunAgain) {
+    perform({create(), StartCall{7}, condition(1)});
+    service.take();
+    service.lateStops = 3;
+    EXPECT_FALSE(perform({StopCall{7}}));
+    EXPECT_FALSE(perform({StopCall{7}}));
+    EXPECT_FALSE(perform({StopCall{7}}));
+    EXPECT_TRUE(perform({StopCall{7}}));
+    EXPECT_THAT(service.take(), ElementsAre("stop 7", "stop 7", "stop 7", "stop 7"));
+}
+
+TEST_F(ReportDeliveryTest, AServiceThatEndsAfterALateStopIsToldTheWholeRun) {
+    perform({create(), StartCall{7}, condition(1)});
+    service.take();
+    service.lateStops = 1;
+    EXPECT_FALSE(perform({StopCall{7}}));
+    service.restart();
+    EXPECT_TRUE(perform({StopCall{7}}));
+    EXPECT_THAT(service.take(), ElementsAre("stop 7", "stop 7", "create 7", "start 7", "send 1 7", "stop 7"));
+}
+
+TEST_F(ReportDeliveryTest, ARunIsRepeatedOnceWhenTheNewServiceIsLateToo) {
+    perform({create(), StartCall{7}, condition(1)});
+    service.take();
+    service.unansweredStops = 1;
+    EXPECT_FALSE(perform({StopCall{7}}));
+    service.lateStops = 1;
+    EXPECT_FALSE(perform({StopCall{7}}));
+    EXPECT_TRUE(perform({StopCall{7}}));
+    EXPECT_THAT(service.take(), ElementsAre("stop 7", "stop 7", "stop 7", "create 7", "start 7", "send 1 7", "stop 7"));
 }
 
 TEST_F(ReportDeliveryTest, ARunIsForgottenWithItsStop) {
@@ -214,12 +260,38 @@ TEST(ReportSenderTest, TakesEndsOnlyWhenTooMuchWaits) {
         sender.startSession(7);
     }
     EXPECT_EQ(sender.dropped(), 0);
-    sender.createSession({});
+    sender.stopSession(7);
+    EXPECT_EQ(sender.dropped(), 0);
+    SessionDescription other;
+    other.reporterID = 8;
+    sender.createSession(other);
     sender.startSession(7);
     EXPECT_EQ(sender.dropped(), 2);
     sender.stopSession(7);
+    sender.destroySession(8);
+    EXPECT_EQ(sender.dropped(), 4) << "the ends of what was not taken";
     sender.destroySession(7);
-    EXPECT_EQ(sender.dropped(), 2);
+    EXPECT_EQ(sender.dropped(), 4);
+    EXPECT_EQ(sender.end(std::chrono::milliseconds(0)), 20'002);
+}
+
+TEST(ReportSenderTest, StreamsThatComeAndGoWithoutAServiceDoNotPileUp) {
+    FakeService service;
+    service.isThere = false;
+    ReportSender sender(service);
+    for (std::int64_t id = 1; id <= 30'000; ++id) {
+        SessionDescription session;
+        session.reporterID = id;
+        sender.createSession(session);
+        sender.startSession(id);
+        sender.stopSession(id);
+        sender.destroySession(id);
+    }
+    // The first session's creation is brought, and everything else waits behind its start.
+    const std::size_t left = sender.end(std::chrono::milliseconds(0));
+    EXPECT_LE(left, 20'003);
+    EXPECT_GE(left, 19'999);
+    EXPECT_GE(sender.dropped(), 99'996);
 }
 
 } // namespace

@@ -17,16 +17,16 @@ ReportSender::ReportSender(ServiceCalls& service) : delivery_(service), thread_(
 
 ReportSender::~ReportSender() { end(std::chrono::milliseconds(0)); }
 
-void ReportSender::createSession(const SessionDescription& session) { add(CreateCall{session}, false); }
-void ReportSender::startSession(std::int64_t reporterID) { add(StartCall{reporterID}, false); }
-void ReportSender::send(std::int64_t reporterID, Report report) { add(SendCall{reporterID, std::move(report)}, false); }
-void ReportSender::stopSession(std::int64_t reporterID) { add(StopCall{reporterID}, true); }
-void ReportSender::destroySession(std::int64_t reporterID) { add(DestroyCall{reporterID}, true); }
+void ReportSender::createSession(const SessionDescription& session) { add(CreateCall{session}); }
+void ReportSender::startSession(std::int64_t reporterID) { add(StartCall{reporterID}); }
+void ReportSender::send(std::int64_t reporterID, Report report) { add(SendCall{reporterID, std::move(report)}); }
+void ReportSender::stopSession(std::int64_t reporterID) { add(StopCall{reporterID}); }
+void ReportSender::destroySession(std::int64_t reporterID) { add(DestroyCall{reporterID}); }
 
-void ReportSender::add(Call call, bool isEnd) {
+void ReportSender::add(Call call) {
     {
         const std::lock_guard lock(mutex_);
-        if (isEnding_ || (calls_.size() >= kMostCalls && !isEnd)) {
+        if (isEnding_ || !admission_.admits(call, calls_.size())) {
             ++dropped_;
             return;
         }

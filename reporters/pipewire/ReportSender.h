@@ -2,6 +2,7 @@
 // Thread-safe. Sleeps as long as there is nothing to bring.
 #pragma once
 
+#include "reporters/pipewire/CallAdmission.h"
 #include "reporters/pipewire/ReportDelivery.h"
 #include "reporters/pipewire/Reports.h"
 
@@ -36,16 +37,17 @@ public:
     /// Calls that were dropped because too many waited for a service.
     std::size_t dropped() const;
 
-    /// Beyond these, only stops and ends are still taken.
+    /// Beyond these, only stops and ends of what was taken before are taken: at most two for each session.
     static constexpr std::size_t kMostCalls = 20'000;
 
 private:
-    void add(Call call, bool isEnd);
+    void add(Call call);
     void run();
 
     mutable std::mutex mutex_; ///< guards what follows
     std::condition_variable changed_;
     std::deque<Call> calls_; ///< the first is being brought
+    CallAdmission admission_{kMostCalls};
     bool isEnding_ = false;
     std::chrono::steady_clock::time_point deadline_;
     std::size_t dropped_ = 0;

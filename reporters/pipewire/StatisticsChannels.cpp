@@ -70,7 +70,7 @@ void StatisticsChannels::check(const Channels& channels) {
 
 const Channels* StatisticsChannels::channelsOf(const std::string& sink) const {
     const auto found = sinks_.find(sink);
-    return found == sinks_.end() ? nullptr : &found->second;
+    return found == sinks_.end() || !found->second.channels ? nullptr : &*found->second.channels;
 }
 
 const Channels& StatisticsChannels::streams(bool capture) {
@@ -83,13 +83,21 @@ const Channels& StatisticsChannels::streams(bool capture) {
 }
 
 void StatisticsChannels::addSink(const std::string& name) {
-    if (!sinks_.contains(name) && sinks_.size() < kMostSinks) {
-        const auto [made, isNew] = sinks_.emplace(name, makeNodeChannels(name.c_str(), "Speaker"));
-        check(made->second);
+    Sink& sink = sinks_[name];
+    if (++sink.count == 1 && published_ < kMostSinks) {
+        ++published_;
+        sink.channels = makeNodeChannels(name.c_str(), "Speaker");
+        check(*sink.channels);
     }
 }
 
-void StatisticsChannels::removeSink(const std::string& name) { sinks_.erase(name); }
+void StatisticsChannels::removeSink(const std::string& name) {
+    const auto found = sinks_.find(name);
+    if (found != sinks_.end() && --found->second.count == 0) {
+        published_ -= found->second.channels ? 1U : 0U;
+        sinks_.erase(found);
+    }
+}
 
 void StatisticsChannels::sinkState(const std::string& name, std::uint8_t state) {
     if (const Channels* const channels = channelsOf(name)) {

@@ -14,6 +14,7 @@
 #include <cstddef>
 #include <functional>
 #include <map>
+#include <optional>
 #include <string>
 #include <vela/channels.hpp>
 
@@ -24,6 +25,7 @@ public:
     /// `folder` is empty for the library's own choice. `complain` is told once why channels cannot be published.
     StatisticsChannels(std::string folder, std::function<void(const std::string&)> complain);
 
+    /// Sinks of one name share their channels, which end with the last of them.
     void addSink(const std::string& name) override;
     void removeSink(const std::string& name) override;
     void sinkState(const std::string& name, std::uint8_t state) override;
@@ -37,6 +39,11 @@ public:
     static constexpr std::size_t kMostSinks = 64;
 
 private:
+    struct Sink {
+        std::size_t count = 0;
+        std::optional<reporting::Channels> channels;
+    };
+
     reporting::Channels makeNodeChannels(const char* driver, const char* group);
     reporting::Channels makeTransitionChannels();
     void check(const reporting::Channels& channels);
@@ -46,7 +53,8 @@ private:
     const std::string folder_;
     const std::function<void(const std::string&)> complain_;
     bool hasComplained_ = false;
-    std::map<std::string, reporting::Channels, std::less<>> sinks_;
+    std::map<std::string, Sink, std::less<>> sinks_;
+    std::size_t published_ = 0;                                 ///< names of sinks that have channels
     std::array<std::optional<reporting::Channels>, 2> streams_; ///< playback, capture
     std::optional<reporting::Channels> transitions_;
 };

@@ -78,7 +78,7 @@ void StreamSession::comeUp(const Moment& now) {
         phase_ = Phase::Starting;
         runStart_ = now;
         totals_ = {};
-        burst_ = 0;
+        incomplete_.clear();
         startWhenKnown(now);
     }
 }
@@ -313,7 +313,7 @@ void StreamSession::tellEverything(const Moment& at) {
 }
 
 void StreamSession::watchStall(const Moment& now) {
-    const bool stalls = !now_.devices.empty() && !isRemoved_ && state_ != NodeState::Running &&
+    const bool stalls = !plan_.isDevice && !now_.devices.empty() && !isRemoved_ && state_ != NodeState::Running &&
                         state_ != NodeState::Idle && state_ != NodeState::Error;
     if (!stalls) {
         stalled_.reset();
@@ -343,13 +343,14 @@ void StreamSession::addCycle(nanoseconds signal, const std::optional<StatisticsS
 }
 
 void StreamSession::noteIncomplete(nanoseconds signal) {
-    if (signal - burstStart_ > kBurstWindow || burst_ == 0) {
-        burstStart_ = signal;
-        burst_ = 0;
+    incomplete_.push_back(signal);
+    if (incomplete_.size() > kIncompleteBurst) {
+        incomplete_.pop_front();
     }
-    if (++burst_ == kIncompleteBurst && (!burstTold_ || signal - *burstTold_ > kBurstPause)) {
+    const bool isBurst = incomplete_.size() == kIncompleteBurst && signal - incomplete_.front() <= kBurstWindow;
+    if (isBurst && (!burstTold_ || signal - *burstTold_ > kBurstPause)) {
         burstTold_ = signal;
-        tellError(momentAt(signal), std::to_string(burst_) + " incomplete cycles within a second");
+        tellError(momentAt(signal), std::to_string(kIncompleteBurst) + " incomplete cycles within a second");
     }
 }
 

@@ -12,7 +12,9 @@
 #include "reporters/pipewire/Reports.h"
 
 #include <chrono>
+#include <cstddef>
 #include <cstdint>
+#include <deque>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -31,7 +33,7 @@ inline constexpr std::chrono::milliseconds kStatisticsDelay{1200};
 /// A stream that is linked and neither runs nor pauses for longer has an error.
 inline constexpr std::chrono::milliseconds kStallDelay{1000};
 /// So many incomplete cycles within a second are an error, told at most once in ten seconds.
-inline constexpr std::int64_t kIncompleteBurst = 5;
+inline constexpr std::size_t kIncompleteBurst = 5;
 
 /// A device that a stream is linked with.
 struct DeviceFacts {
@@ -46,6 +48,7 @@ struct DeviceFacts {
 struct SessionPlan {
     SessionDescription description;
     bool isCapture = false;
+    bool isDevice = false;      ///< which is always linked with itself, and rests when nobody plays
     bool hasStatistics = false; ///< whether there will be cycles
 };
 
@@ -129,8 +132,7 @@ private:
     std::optional<std::chrono::nanoseconds> stalled_;
     bool isStallTold_ = false;
     CycleTotals totals_;
-    std::chrono::nanoseconds burstStart_{};
-    std::int64_t burst_ = 0;
+    std::deque<std::chrono::nanoseconds> incomplete_; ///< when the latest incomplete cycles of the run began
     std::optional<std::chrono::nanoseconds> burstTold_;
 };
 

@@ -422,6 +422,28 @@ TEST_F(StreamSessionTest, APauseIsNoError) {
     EXPECT_THAT(reports.takeWith("Error"), IsEmpty());
 }
 
+TEST_F(StreamSessionTest, ADeviceThatRestsIsNoError) {
+    SessionPlan device = plan();
+    device.isDevice = true;
+    StreamSession session(device, reports, statistics, at(0));
+    session.setDevices(devices("speaker"), at(10));
+    passTime(session, 60000);
+    session.setState(NodeState::Suspended, "", at(60000));
+    passTime(session, 120000);
+    EXPECT_THAT(reports.takeWith("Error"), IsEmpty());
+    EXPECT_FALSE(session.deadline());
+}
+
+TEST_F(StreamSessionTest, AFailedDeviceIsAnError) {
+    SessionPlan device = plan();
+    device.isDevice = true;
+    StreamSession session(device, reports, statistics, at(0));
+    session.setDevices(devices("speaker"), at(10));
+    reports.take();
+    session.setState(NodeState::Error, "unplugged", at(300));
+    EXPECT_THAT(reports.take(), ElementsAre("send 7 Error/Error @1000.300 error=\"unplugged\" where=\"speaker\""));
+}
+
 TEST_F(StreamSessionTest, ABurstOfIncompleteCyclesIsAnErrorEveryTenSeconds) {
     StreamSession session = running(false, true);
     const auto burst = [&](double from, int count) {
@@ -435,6 +457,39 @@ TEST_F(StreamSessionTest, ABurstOfIncompleteCyclesIsAnErrorEveryTenSeconds) {
     EXPECT_EQ(burst(1510, 1), 1);
     EXPECT_EQ(burst(3000, 100), 0);
     EXPECT_EQ(burst(13000, 5), 1);
+}
+
+TEST_F(StreamSessionTest, ABurstCountsWhereverItsSecondBegins) {
+    StreamSession session = running(false, true);
+    for (const double time : {200, 1100, 1150, 1190, 1250}) {
+        session.addCycle(at(time).monotonic, std::nullopt);
+    }
+    EXPECT_THAT(reports.takeWith("Error"), IsEmpty());
+    session.addCycle(at(1300).monotonic, std::nullopt);
+    EXPECT_THAT(reports.takeWith("Error"), ElementsAre("send 7 Error/Error @1001.300 error=\"5 incomplete cycles "
+                                                       "within a second\" where=\"speaker\""));
+}
+
+TEST_F(StreamSessionTest, ABurstIsFiveWithinExactlyASecond) {
+    StreamSession session = running(false, true);
+    for (const double time : {200, 300, 400, 500, 1201}) {
+        session.addCycle(at(time).monotonic, std::nullopt);
+    }
+    EXPECT_THAT(reports.takeWith("Error"), IsEmpty());
+    session.addCycle(at(1300).monotonic, std::nullopt);
+    EXPECT_EQ(reports.takeWith("Error").size(), 1);
+}
+
+TEST_F(StreamSessionTest, ABurstIsOfOneRun) {
+    StreamSession session = running(false, true);
+    for (const double time : {300, 301, 302, 303}) {
+        session.addCycle(at(time).monotonic, std::nullopt);
+    }
+    session.setState(NodeState::Idle, "", at(400));
+    passTime(session, 451);
+    session.setState(NodeState::Running, "", at(500));
+    session.addCycle(at(510).monotonic, std::nullopt);
+    EXPECT_THAT(reports.takeWith("Error"), IsEmpty());
 }
 
 TEST_F(StreamSessionTest, AClockThatIsSetDoesNotChangeTheLengthOfARun) {

@@ -43,11 +43,16 @@ void blockEndSignals() {
     pthread_sigmask(SIG_BLOCK, &signals, nullptr);
 }
 
-/// What differs between devices and is the same on one.
-std::string deviceSecret() {
+/// Says so where names have to be left out that were to be hashed.
+NamePolicy namePolicyOf(NameTreatment treatment) {
+    constexpr const char* kFile = "/etc/machine-id";
     constexpr std::size_t kMost = 256;
-    const platform::Result<std::string> text = platform::LinuxFileSystem().readFile("/etc/machine-id", kMost);
-    return text ? *text : std::string();
+    const platform::Result<std::string> text = platform::LinuxFileSystem().readFile(kFile, kMost);
+    const std::string secret = deviceSecretOf(text ? *text : "");
+    if (treatment == NameTreatment::Hash && secret.empty()) {
+        tell(std::string("names of applications are left out: ") + kFile + " has no ID to hash them with");
+    }
+    return {treatment, secret};
 }
 
 int watch(const ReporterSettings& settings) {
@@ -64,7 +69,7 @@ int watch(const ReporterSettings& settings) {
     }
     ReportSender sender(service);
     const ReportingRules rules{settings.leftOutApplications, settings.leftOutRoles, settings.leftOutNodes,
-                               NamePolicy(settings.names, deviceSecret()), settings.deviceSessions};
+                               namePolicyOf(settings.names), settings.deviceSessions};
     GraphModel model(rules, sender, *statistics);
     PipeWireWatcher watcher({settings.remote, settings.statistics}, model, tell);
     const bool watched = watcher.run();
