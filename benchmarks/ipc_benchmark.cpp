@@ -2,7 +2,8 @@
 // message and beside sd-bus. Each subject has its server in a process of its own. Rounds are interleaved, and figures
 // are medians over the rounds; a ratio is the median of the ratios within each round, so that a busy machine weighs on
 // both sides. (a) and (b) decode the message into a map and answer; (c) is the service with all its work: session,
-// list, bridges, real-time reporting of the first sessions into its store. Each client has a session of its own.
+// list, bridges, real-time reporting of the first sessions into its store. Each client has a session of its own, and
+// writes calls that it makes together as the client library does, many at a time.
 //
 // usage: ipc_benchmark [ROUNDS [CLIENTS]]
 // With CLIENTS, only for so many clients, and nothing of the service at rest.

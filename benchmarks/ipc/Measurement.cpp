@@ -38,6 +38,7 @@ public:
         case Phase::OneWay:
             for (std::size_t count = 1; count < messages; ++count) {
                 channel_.post(number_++, false);
+                channel_.flush();
             }
             return channel_.call(number_++);
         }
@@ -54,6 +55,7 @@ private:
                 for (; posted < messages && posted - taken < window_; ++posted) {
                     channel_.post(number_++, true);
                 }
+                channel_.flush();
             }
             channel_.takeReply();
         }

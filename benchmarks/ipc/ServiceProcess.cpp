@@ -119,15 +119,23 @@ public:
     }
 
     void post(std::int64_t number, bool reply) override {
-        bytes_.clear();
         appendMessage(bytes_, nextSerial_, number, reporterID_, reply);
         ++nextSerial_;
         nextReply_ += reply ? 0 : 1; // nothing is under way when the sending without replies begins
+        if (bytes_.size() >= kWriteBytes) {
+            flush();
+        }
+    }
+    void flush() override {
         require(static_cast<bool>(connection_.send(bytes_)), "service: send");
+        bytes_.clear();
     }
     void takeReply() override { requireGoodReply(connection_.receive(nextReply_++, kPatience)); }
 
 private:
+    /// Calls that are made together leave in writes of about so many bytes, as the client library has it.
+    static constexpr std::size_t kWriteBytes = 16 * 1024;
+
     dbus::BlockingConnection connection_;
     const std::int64_t reporterID_;
     std::uint32_t nextSerial_ = 0;

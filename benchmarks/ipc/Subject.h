@@ -15,13 +15,15 @@ class Channel {
 public:
     virtual ~Channel() = default;
 
-    /// Sends message `number`. With `reply`, one comes, in the order of the messages.
+    /// Sends message `number`, at `flush` at the latest. With `reply`, one comes, in the order of the messages.
     virtual void post(std::int64_t number, bool reply) = 0;
+    virtual void flush() {}
     /// Waits for the next reply.
     virtual void takeReply() = 0;
     /// Both, as a program does that has nothing else to do.
     virtual void call(std::int64_t number) {
         post(number, true);
+        flush();
         takeReply();
     }
 };

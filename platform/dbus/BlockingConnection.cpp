@@ -17,6 +17,8 @@ Failure systemFailure(const std::string& what, int error) {
     return {error, what + ": " + std::strerror(error)}; // NOLINT(concurrency-mt-unsafe): glibc's is safe
 }
 
+std::uint32_t serialOf(const Reply& reply) { return reply.header.replySerial; }
+
 Failure closedFailure() { return {ECONNRESET, "the service closed the connection"}; }
 
 } // namespace
@@ -27,6 +29,10 @@ std::string Reply::errorText() const {
     }
     BodyReader body(header);
     return std::string(body.string());
+}
+
+bool BlockingConnection::hasReply(std::uint32_t serial) const {
+    return std::ranges::find(replies_, serial, serialOf) != replies_.end();
 }
 
 Result<BlockingConnection> BlockingConnection::open(const std::vector<SocketAddress>& addresses, Nanoseconds patience) {
@@ -102,8 +108,11 @@ Result<Done> BlockingConnection::send(std::string_view bytes) {
 
 Result<Reply> BlockingConnection::receive(std::uint32_t serial, Nanoseconds patience) {
     for (;;) {
-        if (auto found = replies_.extract(serial)) {
-            return std::move(found.mapped());
+        const auto found = std::ranges::find(replies_, serial, serialOf);
+        if (found != replies_.end()) {
+            Reply reply = std::move(*found);
+            replies_.erase(found);
+            return reply;
         }
         Result<Done> taken = takeIn(patience);
         if (taken) {
@@ -177,7 +186,7 @@ Result<Done> BlockingConnection::takeApart() {
             return Failure{EPROTO, "the service sent a broken message: " + fault->text};
         }
         if (reply.header.type == MessageType::MethodReturn || reply.header.type == MessageType::Error) {
-            replies_.insert_or_assign(reply.header.replySerial, std::move(reply));
+            replies_.push_back(std::move(reply));
         }
     }
 }

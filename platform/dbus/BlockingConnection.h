@@ -10,7 +10,7 @@
 #include "platform/linux/FileDescriptor.h"
 
 #include <cstdint>
-#include <map>
+#include <deque>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -47,7 +47,7 @@ public:
     Result<Reply> receive(std::uint32_t serial, Nanoseconds patience);
 
     /// Whether a reply to the call has come in already.
-    bool hasReply(std::uint32_t serial) const { return replies_.contains(serial); }
+    bool hasReply(std::uint32_t serial) const;
 
 private:
     explicit BlockingConnection(FileDescriptor descriptor) : descriptor_(std::move(descriptor)) {}
@@ -66,7 +66,7 @@ private:
     std::uint32_t serial_ = 0;
     std::vector<char> scratch_ = std::vector<char>(kReadBytes); ///< what a reading fills
     std::string received_;
-    std::map<std::uint32_t, Reply> replies_;
+    std::deque<Reply> replies_; ///< in the order in which they came, which is mostly that of the calls
 };
 
 } // namespace vela::platform::dbus

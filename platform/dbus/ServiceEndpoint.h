@@ -46,7 +46,7 @@ struct DbusServiceOptions {
     std::uint32_t sessionsPerClient = 1024;
     std::uint32_t clientsPerUser = 256;
     std::uint64_t unsentReplies = 4 * 1024 * 1024; ///< bytes of one client
-    std::uint32_t callsInFlight = 64;              ///< of one client
+    std::uint32_t callsInFlight = 128;             ///< of one client
     std::chrono::milliseconds authentication{5000};
 
     /// Whether SIGTERM and SIGINT end `resume`. Other threads must have them blocked: see blockEndSignals.

@@ -151,23 +151,23 @@ TEST(ServiceEndpointLimitsTest, OnlySoManyCallsAreUnderWay) {
     RunningEndpoint endpoint;
     endpoint.service->keepReplies();
     RawClient client = endpoint.client();
-    for (std::uint32_t serial = 1; serial <= 100; ++serial) {
+    for (std::uint32_t serial = 1; serial <= 200; ++serial) {
         client.send(simpleCall("stopReportingSessionForID", serial, serial));
     }
-    endpoint.journal.waitFor(65);
+    endpoint.journal.waitFor(129);
     // Another client is served meanwhile, several times over.
     RawClient other = endpoint.client();
     for (int count = 0; count < 10; ++count) {
         other.call(callOf("Ping", "", Bytes(), 7, 0, kPeerInterface));
     }
-    EXPECT_EQ(endpoint.journal.lines().size(), 66U);
+    EXPECT_EQ(endpoint.journal.lines().size(), 130U);
     auto replies = endpoint.service->takeReplies();
-    ASSERT_EQ(replies.size(), 64U);
+    ASSERT_EQ(replies.size(), 128U);
     for (auto& reply : replies) {
         reply();
     }
-    endpoint.journal.waitFor(102);
-    for (std::uint32_t serial = 1; serial <= 64; ++serial) {
+    endpoint.journal.waitFor(202);
+    for (std::uint32_t serial = 1; serial <= 128; ++serial) {
         EXPECT_EQ(client.readMessage().header.replySerial, serial);
     }
 }
@@ -262,13 +262,13 @@ TEST(ServiceEndpointLimitsTest, KillingWorksWhileEverythingIsBlocked) {
     RunningEndpoint endpoint;
     endpoint.service->keepReplies();
     RawClient blocked = endpoint.client();
-    for (std::uint32_t serial = 1; serial <= 64; ++serial) {
+    for (std::uint32_t serial = 1; serial <= 128; ++serial) {
         blocked.send(simpleCall("stopReportingSessionForID", serial, serial));
     }
-    endpoint.journal.waitFor(65);
+    endpoint.journal.waitFor(129);
     RawClient other = endpoint.client();
     other.send(callOf("killService", "", Bytes()));
-    EXPECT_EQ(endpoint.journal.waitFor(67).back(), "kill");
+    EXPECT_EQ(endpoint.journal.waitFor(131).back(), "kill");
     EXPECT_FALSE(other.somethingToRead());
 }
 

@@ -21,7 +21,7 @@ bool isNamed(const StoreRecord& record, std::int64_t shape) { return shape == 0 
 
 // "OR FAIL": without it SQLite notes for each statement how to take it back, and a failure takes back the whole
 // transaction anyway.
-SqliteStatement StoreTable::prepareInsert(std::size_t rows) {
+bool StoreTable::prepare(Insertion& insertion, std::size_t rows) {
     std::string sql = "INSERT OR FAIL INTO " + std::string(nameOf(backend_)) +
                       "(seq, ts, session, operation, category, type, shape, name, number, vals, record) VALUES";
     for (std::size_t row = 0; row < rows; ++row) {
@@ -31,13 +31,13 @@ SqliteStatement StoreTable::prepareInsert(std::size_t rows) {
         }
         sql += ')';
     }
-    return database_->prepare(sql);
+    insertion.statement = database_->prepare(sql);
+    insertion.bound.assign(rows, {});
+    return static_cast<bool>(insertion.statement);
 }
 
 bool StoreTable::load() {
     const std::string name(nameOf(backend_));
-    insert_ = prepareInsert(1);
-    insertTogether_ = prepareInsert(kRowsTogether);
     oldest_ = database_->prepare("SELECT seq, operation, vals, name, record FROM " + name + " ORDER BY seq");
     delete_ = database_->prepare("DELETE FROM " + name + " WHERE seq <= ?1");
     account_ = database_->prepare("UPDATE backend SET rows = ?1, bytes = ?2, evicted = ?3, evicted_marks = ?4, "
@@ -45,7 +45,7 @@ bool StoreTable::load() {
     SqliteStatement read = database_->prepare(
         "SELECT rows, bytes, evicted, evicted_marks, last_evicted, (SELECT coalesce(max(seq), 0) FROM " + name +
         ") FROM backend WHERE backend = ?1");
-    if (!insert_ || !insertTogether_ || !oldest_ || !delete_ || !account_ || !read) {
+    if (!oldest_ || !delete_ || !account_ || !read) {
         return false;
     }
     read.bind(1, static_cast<std::int64_t>(backend_));
@@ -77,25 +77,31 @@ bool StoreTable::insert(const StoreRecord& record, const StoreRow& row) {
     ++usage_.rows;
     usage_.bytes +=
         rowBytes(row.values.size(), isNamed(record, row.shape) ? record.name.view().size() : 0, record.bytes.size());
-    return (waiting_.size() < kRowsTogether && waitingValues_.size() < kBytesTogether) || writeRows();
+    return (waiting_.size() < kRowsTogether.front() && waitingValues_.size() < kBytesTogether) || writeRows();
 }
 
 bool StoreTable::writeRows() {
     bool written = true;
-    if (waiting_.size() == kRowsTogether) {
-        for (std::size_t place = 0; place < kRowsTogether; ++place) {
-            bind(insertTogether_, place, waiting_[place]);
-        }
-        written = insertTogether_.run();
-    } else {
+    std::span<const WaitingRow> rest = waiting_;
+    for (std::size_t size = 0; size < kRowsTogether.size(); ++size) {
+        const std::size_t together = kRowsTogether[size];
         // Not one row more than up to a failure: binding it would clear the failure's text.
-        written = std::ranges::all_of(waiting_, [this](const WaitingRow& row) {
-            bind(insert_, 0, row);
-            return insert_.run();
-        });
+        for (; written && rest.size() >= together; rest = rest.subspan(together)) {
+            written = write(insertions_[size], rest.first(together));
+        }
     }
     forgetRows();
     return written;
+}
+
+bool StoreTable::write(Insertion& insertion, std::span<const WaitingRow> rows) {
+    if (!insertion.statement && !prepare(insertion, rows.size())) {
+        return false;
+    }
+    for (std::size_t place = 0; place < rows.size(); ++place) {
+        bind(insertion, place, rows[place]);
+    }
+    return insertion.statement.run();
 }
 
 void StoreTable::rolledBack() {
@@ -111,28 +117,39 @@ void StoreTable::forgetRows() {
     }
 }
 
-void StoreTable::bind(SqliteStatement& statement, std::size_t place, const WaitingRow& row) {
+void StoreTable::bind(Insertion& insertion, std::size_t place, const WaitingRow& row) {
     const StoreRecord& record = *row.record;
+    SqliteStatement& statement = insertion.statement;
+    BoundRow& bound = insertion.bound[place];
     int column = static_cast<int>(place * kColumns);
+    const auto bindWhereOther = [&](std::optional<std::int64_t> number, std::optional<std::int64_t>& before) {
+        ++column;
+        if (number != before) {
+            statement.bind(column, number);
+            before = number;
+        }
+    };
+    const auto bindIfAny = [&](bool has, bool& had, const auto& bindIt) {
+        ++column;
+        if (has) {
+            bindIt();
+        } else if (had) {
+            statement.bindNull(column);
+        }
+        had = has;
+    };
     statement.bind(++column, row.seq);
     statement.bind(++column, microseconds(record.time));
-    statement.bind(++column, record.session);
-    statement.bind(++column, static_cast<std::int64_t>(record.operation));
-    statement.bind(++column, record.category);
-    statement.bind(++column, record.type);
-    statement.bind(++column, row.shape == 0 ? std::nullopt : std::optional(row.shape));
-    if (isNamed(record, row.shape)) {
-        statement.bindText(++column, record.name.view());
-    } else {
-        statement.bindNull(++column);
-    }
-    statement.bind(++column, record.number);
+    bindWhereOther(record.session, bound.session);
+    bindWhereOther(static_cast<std::int64_t>(record.operation), bound.operation);
+    bindWhereOther(record.category, bound.category);
+    bindWhereOther(record.type, bound.type);
+    bindWhereOther(row.shape == 0 ? std::nullopt : std::optional(row.shape), bound.shape);
+    bindIfAny(isNamed(record, row.shape), bound.hasName, [&] { statement.bindText(column, record.name.view()); });
+    bindWhereOther(record.number, bound.number);
     statement.bindText(++column, std::string_view(waitingValues_).substr(row.begin, row.end - row.begin));
-    if (record.operation == StoreOperation::Post) {
-        statement.bindBytes(++column, record.bytes);
-    } else {
-        statement.bindNull(++column);
-    }
+    bindIfAny(record.operation == StoreOperation::Post, bound.hasRecord,
+              [&] { statement.bindBytes(column, record.bytes); });
 }
 
 bool StoreTable::evict(std::int64_t bytes) {

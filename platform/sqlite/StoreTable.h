@@ -4,8 +4,11 @@
 #include "platform/sqlite/SqliteDatabase.h"
 #include "platform/sqlite/StoreRecord.h"
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
+#include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -59,7 +62,7 @@ public:
 
 private:
     /// Rows that one statement writes: a statement by itself costs as much as some rows.
-    static constexpr std::size_t kRowsTogether = 16;
+    static constexpr std::array<std::size_t, 3> kRowsTogether{64, 16, 1};
 
     /// Values that wait for no more rows.
     static constexpr std::size_t kBytesTogether = 256 * 1024;
@@ -72,14 +75,31 @@ private:
         std::size_t end = 0;
     };
 
+    /// What a row's place in a statement is bound to. Rows of one session differ in little, and what stays the same
+    /// need not be bound anew.
+    struct BoundRow {
+        std::optional<std::int64_t> session;
+        std::optional<std::int64_t> operation;
+        std::optional<std::int64_t> category;
+        std::optional<std::int64_t> type;
+        std::optional<std::int64_t> shape;
+        std::optional<std::int64_t> number;
+        bool hasName = false;
+        bool hasRecord = false;
+    };
+    struct Insertion {
+        SqliteStatement statement;
+        std::vector<BoundRow> bound; ///< one for each of its rows
+    };
+
     void forgetRows();
-    SqliteStatement prepareInsert(std::size_t rows);
-    void bind(SqliteStatement& statement, std::size_t place, const WaitingRow& row);
+    [[nodiscard]] bool prepare(Insertion& insertion, std::size_t rows);
+    [[nodiscard]] bool write(Insertion& insertion, std::span<const WaitingRow> rows);
+    void bind(Insertion& insertion, std::size_t place, const WaitingRow& row);
 
     SqliteDatabase* database_;
     DeliveryBackend backend_;
-    SqliteStatement insert_;
-    SqliteStatement insertTogether_;
+    std::array<Insertion, kRowsTogether.size()> insertions_; ///< made when they are first needed
     SqliteStatement oldest_;
     SqliteStatement delete_;
     SqliteStatement account_;
