@@ -13,7 +13,6 @@ namespace vela {
 
 namespace {
 
-using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 
 /// Messages that carry a payload; the rest are marks of where a session begins and ends.
@@ -184,10 +183,11 @@ TEST_F(ServiceDeliveriesTest, AnEventWithoutAConsumerIsDroppedWithThatReason) {
 }
 
 TEST_F(ServiceDeliveriesTest, NothingCommittedIsLostWhenTheServiceIsKilledUnderLoad) {
-    const char* wanted = std::getenv("VELA_KILL_ROUNDS");
-    const int rounds = wanted == nullptr ? 5 : std::atoi(wanted);
+    const char* const wanted = std::getenv("VELA_KILL_ROUNDS"); // NOLINT(concurrency-mt-unsafe): one thread
+    const long rounds = wanted == nullptr ? 5 : std::strtol(wanted, nullptr, 10);
+    // NOLINTNEXTLINE(cert-msc32-c,cert-msc51-cpp): a failure must be met again
     std::mt19937 random(1);
-    for (int round = 0; round < rounds; ++round) {
+    for (long round = 0; round < rounds; ++round) {
         {
             ServiceClient client = service_.client();
             startSession(client);

@@ -137,6 +137,7 @@ TEST(ServiceLifeTest, ASoftLimitOfDescriptorsDoesNotBoundItsClients) {
     ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &wide), 0);
     {
         std::vector<ServiceClient> clients;
+        clients.reserve(300);
         for (int count = 0; count < 300; ++count) {
             clients.push_back(service.client());
         }

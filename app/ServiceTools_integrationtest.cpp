@@ -32,7 +32,7 @@ protected:
         return service_.run(words);
     }
     std::string file(const std::string& content) {
-        const std::string path = service_.folder("calls.jsonl");
+        std::string path = service_.folder("calls.jsonl");
         std::ofstream(path) << content;
         return path;
     }

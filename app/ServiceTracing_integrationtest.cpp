@@ -204,7 +204,7 @@ std::string losingRun() {
     client.call("setConfiguration", R"([{"VelaReportingKilnPlistFilePath":")" + parameters + R"("},42])");
     client.call("startReportingSessionForID", "[42]");
     const ForkedClient emitter = loser(service);
-    const std::string outcome = emitter.report();
+    std::string outcome = emitter.report();
     if (outcome != "lost" || client.call("stopReportingSessionForID", "[42]") != "true") {
         return outcome;
     }

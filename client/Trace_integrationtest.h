@@ -19,15 +19,17 @@
 namespace vela::client {
 
 class TraceTest : public ::testing::Test {
+public:
+    TraceTest() { setenv("VELA_RUNTIME", runtimeFolder().c_str(), 1); } // NOLINT(concurrency-mt-unsafe): no thread yet
+    ~TraceTest() override { unsetenv("VELA_RUNTIME"); }                 // NOLINT(concurrency-mt-unsafe)
+    TraceTest(const TraceTest&) = delete;
+    TraceTest& operator=(const TraceTest&) = delete;
+
 protected:
     static const std::string& runtimeFolder() {
         static const testing::TemporaryFolder folder;
         return folder.path();
     }
-    TraceTest() { setenv("VELA_RUNTIME", runtimeFolder().c_str(), 1); } // NOLINT(concurrency-mt-unsafe): no thread yet
-    ~TraceTest() override { unsetenv("VELA_RUNTIME"); }                 // NOLINT(concurrency-mt-unsafe)
-    TraceTest(const TraceTest&) = delete;
-    TraceTest& operator=(const TraceTest&) = delete;
 
     void start(std::uint32_t first = 0x21040000, std::uint32_t last = 0x2104408A) {
         session_ = spoor_.createSession();

@@ -262,6 +262,7 @@ TEST(DictionaryBuilderTest, GrowsBeyondItsOwnRoom) {
 
 // Random steps, each mirrored in a plain list of pairs.
 TEST(DictionaryTest, AgreesWithAPlainListUnderRandomSteps) {
+    // NOLINTNEXTLINE(cert-msc32-c,cert-msc51-cpp): a failure must be met again
     std::mt19937 random(7);
     const auto below = [&random](unsigned limit) { return static_cast<int>(random() % limit); };
     for (int round = 0; round < 300; ++round) {

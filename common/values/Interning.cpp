@@ -101,6 +101,7 @@ public:
     }
 
     std::size_t size() const { return count_; }
+    std::uint64_t bytes() const { return bytes_; }
 
 private:
     static constexpr std::size_t kFirstSweep = 4096;
@@ -547,7 +548,7 @@ const ShapeObject* shapeWithoutSpaces(const ShapeObject* shape) {
 InternedCounts internedCounts() {
     detail::Interned& tables = detail::interned();
     const std::scoped_lock lock(tables.mutex);
-    return {tables.keys.size(), tables.shapes.size()};
+    return {tables.keys.size(), tables.shapes.size(), tables.keys.bytes() + tables.shapes.bytes()};
 }
 
 } // namespace vela

@@ -76,6 +76,7 @@ private:
 struct InternedCounts {
     std::size_t keys = 0;
     std::size_t shapes = 0;
+    std::uint64_t bytes = 0; ///< of both; a key counts once for each list that has it, and for itself
 };
 InternedCounts internedCounts();
 

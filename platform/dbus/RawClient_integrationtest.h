@@ -50,7 +50,7 @@ public:
         address.sun_family = AF_UNIX;
         std::memcpy(address.sun_path, path.data(), std::min(path.size(), sizeof(address.sun_path) - 1));
         EXPECT_EQ(connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0)
-            << std::strerror(errno);
+            << std::strerror(errno); // NOLINT(concurrency-mt-unsafe): glibc's is safe
     }
     explicit RawClient(FileDescriptor socket) : socket_(std::move(socket)) {
         const timeval patience{kPatience.count(), 0};
@@ -96,7 +96,8 @@ public:
         std::size_t have = 0;
         while (have < bytes) {
             const ssize_t count = recv(socket_.get(), result.data() + have, bytes - have, 0);
-            EXPECT_TRUE(count >= 0 || errno == ECONNRESET) << "nothing came: " << std::strerror(errno);
+            EXPECT_TRUE(count >= 0 || errno == ECONNRESET)
+                << "nothing came: " << std::strerror(errno); // NOLINT(concurrency-mt-unsafe)
             if (count <= 0) {
                 break;
             }

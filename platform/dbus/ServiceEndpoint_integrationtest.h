@@ -146,16 +146,15 @@ private:
     }
     /// Journals before it answers and after it keeps, so that whoever waits for the line or the answer finds both.
     void answerOrKeep(std::string line, UniqueFunction<void()> answer) {
-        bool keep = false;
         {
             const std::lock_guard lock(mutex_);
-            keep = keepReplies_;
-            if (keep) {
+            if (keepReplies_) {
                 kept_.push_back(std::move(answer));
+                answer = nullptr;
             }
         }
         journal_.add(std::move(line));
-        if (!keep) {
+        if (answer) {
             answer();
         }
     }

@@ -29,6 +29,7 @@ public:
 
 private:
     // Any other model may allocate at a thread's first access.
+    // NOLINTNEXTLINE(readability-identifier-naming): a member
     [[gnu::tls_model("initial-exec")]] inline static constinit thread_local volatile bool isUnderWay_ = false;
 
     const bool before_;
