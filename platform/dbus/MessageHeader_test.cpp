@@ -12,7 +12,7 @@ namespace vela::platform::dbus {
 
 namespace {
 
-using std::string_view_literals::operator""sv;
+using std::string_view_literals::operator""sv; // NOLINT(misc-unused-using-decls): the tool does not see literals
 
 // The form of a message.
 

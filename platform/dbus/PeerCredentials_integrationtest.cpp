@@ -16,7 +16,7 @@ namespace {
 
 /// Another process that connects to a socket, and its end of the connection.
 class PeerCredentialsTest : public ::testing::Test {
-protected:
+public:
     PeerCredentialsTest() {
         sockaddr_un address{};
         address.sun_family = AF_UNIX;
@@ -38,8 +38,11 @@ protected:
         }
         socket_ = FileDescriptor(accept4(listening.get(), nullptr, nullptr, SOCK_CLOEXEC));
     }
+    PeerCredentialsTest(const PeerCredentialsTest&) = delete;
+    PeerCredentialsTest& operator=(const PeerCredentialsTest&) = delete;
     ~PeerCredentialsTest() override { reap(); }
 
+protected:
     void endChild() {
         kill(child_, SIGKILL);
         siginfo_t information{};

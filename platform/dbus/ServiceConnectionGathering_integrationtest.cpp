@@ -14,7 +14,7 @@ constexpr std::uint32_t kCallsInFlight = 100;
 
 /// A connection that is open, without an endpoint: its loop is asked for events and it is given its turns by hand.
 class ServiceConnectionGatheringTest : public ::testing::Test {
-protected:
+public:
     ServiceConnectionGatheringTest() {
         std::array<int, 2> ends{};
         EXPECT_EQ(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()), 0);
@@ -38,6 +38,8 @@ protected:
         loop_->takeRung();
         service_->keepReplies();
     }
+    ServiceConnectionGatheringTest(const ServiceConnectionGatheringTest&) = delete;
+    ServiceConnectionGatheringTest& operator=(const ServiceConnectionGatheringTest&) = delete;
     ~ServiceConnectionGatheringTest() override {
         for (auto& reply : service_->takeReplies()) {
             reply();
@@ -45,6 +47,7 @@ protected:
         connection_->end();
     }
 
+protected:
     /// Sends calls with the serials from `first` on, without waiting for replies.
     void sendCalls(std::uint32_t first, std::uint32_t count) {
         for (std::uint32_t serial = first; serial < first + count; ++serial) {

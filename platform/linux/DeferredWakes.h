@@ -32,6 +32,7 @@ public:
     }
 
 private:
+    // NOLINTNEXTLINE(readability-identifier-naming): a member
     static inline constinit thread_local DeferredWakes* current_ = nullptr;
 
     DeferredWakes* const outer_;
