@@ -15,7 +15,7 @@ namespace {
 using namespace std::chrono_literals;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
-using std::string_view_literals::operator""sv;
+using std::string_view_literals::operator""sv; // NOLINT(misc-unused-using-decls): the tool does not see literals
 
 // The end of a connection.
 
@@ -92,7 +92,9 @@ TEST(ServiceEndpointLifeTest, BytesThatAreNoMessageInterruptAndInvalidate) {
                                    callOf("", "", Bytes()), boolean, std::string(16, 'l')}) {
         RunningEndpoint endpoint;
         RawClient client = endpoint.client();
-        client.send(good + bad + good);
+        for (const std::string& bytes : {good, bad, good}) {
+            client.send(bytes);
+        }
         endpoint.journal.waitFor(4);
         EXPECT_THAT(endpoint.journal.lines(), ElementsAre("connected", "stop 1", "interrupted", "invalidated"));
         EXPECT_EQ(client.readMessage().header.replySerial, 7U);
@@ -294,9 +296,9 @@ TEST(ServiceEndpointLifeTest, ASignalEndsTheEndpoint) {
             if (!endpoint) {
                 _exit(2);
             }
-            (*std::move(endpoint))->setDelegate(delegate);
+            const auto owned = *std::move(endpoint);
+            owned->setDelegate(delegate);
             kill(getpid(), signal);
-            auto owned = *std::move(endpoint);
             _exit(owned->resume() ? 0 : 3);
         }
         int status = 0;

@@ -10,7 +10,7 @@ namespace {
 using namespace std::chrono_literals;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
-using std::string_view_literals::operator""sv;
+using std::string_view_literals::operator""sv; // NOLINT(misc-unused-using-decls): the tool does not see literals
 
 TEST(ServiceEndpointLimitsTest, AMessageTooLongIsRefusedAndPassedOver) {
     DbusServiceOptions options;
@@ -134,6 +134,7 @@ TEST(ServiceEndpointLimitsTest, ManyRefusedConnectionsAreAllTold) {
     RunningEndpoint endpoint(std::move(options));
     RawClient first = endpoint.client();
     std::vector<RawClient> others;
+    others.reserve(100);
     for (int count = 0; count < 100; ++count) {
         others.emplace_back(endpoint.path());
     }
@@ -397,6 +398,7 @@ TEST(ServiceEndpointLimitsTest, WithoutDescriptorsClientsWaitAndTheLoopDoesNotSp
     RunningEndpoint endpoint(std::move(options));
     RawClient first = endpoint.client();
     std::vector<RawClient> waiting;
+    waiting.reserve(5);
     for (int count = 0; count < 5; ++count) {
         waiting.emplace_back(endpoint.path());
     }

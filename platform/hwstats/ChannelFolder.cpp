@@ -41,7 +41,7 @@ std::size_t bytesOf(const ChannelTable& table) {
         bytes += sizeof(channel) + channel.name.size() + channel.unit.value_or("").size() +
                  channel.bounds.size() * sizeof(std::int64_t);
         for (const std::string& state : channel.states) {
-            bytes += sizeof(state) + state.size();
+            bytes += sizeof(std::string) + state.size();
         }
     }
     return bytes;

@@ -176,7 +176,7 @@ Result<TraceFile> TraceFiles::reserve() const {
     for (const Numbered& part : filesWith(folder, kPartSuffix)) {
         removeWhenFree(folder, part.name);
     }
-    constexpr int kMostTries = 100; // each lost to a service that cleans the same folder up
+    constexpr int kMostTries = 100; // each lost to a trace that cleans the same folder up
     std::uint32_t number = highestNumber(folder);
     for (int tries = 0; tries < kMostTries; ++tries) {
         ++number;
@@ -184,16 +184,16 @@ Result<TraceFile> TraceFiles::reserve() const {
         const std::string part = name + std::string(kPartSuffix);
         FileDescriptor file(
             openat(folder.get(), part.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, kFilePermissions));
+        if (!file && errno != EEXIST) {
+            return failureOf("file for a trace in " + folder_, errno);
+        }
+        // Until it is locked it may be taken for one left behind, by a trace that begins at the same time.
         struct stat status {};
-        // Until it is locked it may be taken for one left behind.
         if (file && lock(file) && fstat(file.get(), &status) == 0 && status.st_nlink > 0) {
             return TraceFile(folder_ + "/" + name + std::string(kSuffix), std::move(folder), std::move(file));
         }
-        if (errno != EEXIST && errno != EWOULDBLOCK) {
-            break;
-        }
     }
-    return failureOf("file for a trace in " + folder_, errno);
+    return failureOf("file for a trace in " + folder_, EAGAIN);
 }
 
 void TraceFiles::removeOldest() const {
