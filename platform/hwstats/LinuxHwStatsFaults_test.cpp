@@ -52,15 +52,18 @@ private:
 };
 
 class LinuxHwStatsFaultsTest : public ::testing::Test {
-protected:
+public:
     LinuxHwStatsFaultsTest() {
         std::filesystem::create_directories(folder_ / "hwstats");
         tree_.write("/sys/devices/system/cpu/cpu0/cpuidle/state0/name", "C1");
         tree_.write("/sys/devices/system/cpu/cpu0/cpuidle/state0/usage", "4");
         tree_.write("/sys/devices/system/cpu/cpu0/cpuidle/state0/time", "5");
     }
+    LinuxHwStatsFaultsTest(const LinuxHwStatsFaultsTest&) = delete;
+    LinuxHwStatsFaultsTest& operator=(const LinuxHwStatsFaultsTest&) = delete;
     ~LinuxHwStatsFaultsTest() override { clock_.release(); }
 
+protected:
     LinuxHwStatsOptions options(std::chrono::milliseconds wait) const {
         return {folder_ / "hwstats",
                 tree_.root(),
