@@ -73,10 +73,11 @@ std::string newName(const std::string& folder, const std::string& time, const st
     for (const SnapshotName& name : names) {
         number = name.time == time ? std::max(number, name.number) : number;
     }
-    std::string path;
+    const auto next = [&] { return folder + "/" + time + "-" + std::to_string(++number) + std::string(kExtension); };
+    std::string path = next();
     std::error_code ignored;
-    while (path.empty() || std::filesystem::exists(path, ignored)) {
-        path = folder + "/" + time + "-" + std::to_string(++number) + std::string(kExtension);
+    while (std::filesystem::exists(path, ignored)) {
+        path = next();
     }
     return path;
 }
