@@ -320,6 +320,11 @@ TEST_F(TraceEmitterTest, EventsOfASignalsHandlerAreWrittenOrCounted) {
 // Each round has an emitter that knows nothing yet: the handler comes in the midst of its finding the service and of
 // its making a ring, where locks are held.
 TEST_F(TraceEmitterTest, ASignalsHandlerMayEmitInTheMidstOfTheFirstEvent) {
+#if defined(__has_feature)
+#if __has_feature(thread_sanitizer)
+    GTEST_SKIP() << "the sanitizer refuses a handler that comes before the first event, and makes the ring itself";
+#endif
+#endif
     constexpr std::size_t kRounds = 30;
     collect();
     interruptions = 0;
