@@ -67,6 +67,11 @@ void emitInHandler(int) {
 
 // In a process that has emitted nothing yet: what is under way then holds locks and allocates.
 TEST_F(TraceTest, ASignalsHandlerMayEmitInTheMidstOfTheFirstEvent) {
+#if defined(__has_feature)
+#if __has_feature(thread_sanitizer)
+    GTEST_SKIP() << "the sanitizer refuses a handler that comes before the first event, and makes the emitter itself";
+#endif
+#endif
     start();
     const pid_t child = fork();
     if (child == 0) {
