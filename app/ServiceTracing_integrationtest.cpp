@@ -104,16 +104,21 @@ std::string differenceOf(const std::vector<std::int64_t>& durations, const std::
     return "";
 }
 
-/// Runs a trace, and answers what is wrong with its results, or "".
-std::string tracedRun() {
-    const RunningService service({R"(features."AudioAnalytics/Tracing"=true)"});
+/// Session 42 traces what kParameters names.
+void startTracing(const RunningService& service, ServiceClient& client) {
     const std::string parameters = service.folder("points.plist");
     std::ofstream(parameters) << kParameters;
-    ServiceClient client = service.client();
     client.call("createReportingSession", "[42]");
     client.call("setServiceType", "[11,42]");
     client.call("setConfiguration", R"([{"VelaReportingKilnPlistFilePath":")" + parameters + R"("},42])");
     client.call("startReportingSessionForID", "[42]");
+}
+
+/// Runs a trace, and answers what is wrong with its results, or "".
+std::string tracedRun() {
+    const RunningService service({R"(features."AudioAnalytics/Tracing"=true)"});
+    ServiceClient client = service.client();
+    startTracing(service, client);
     const ForkedClient first = emitter(service, kFirstBegin);
     const ForkedClient second = emitter(service, kSecondBegin);
     const std::vector<Bounds> firstBounds = boundsOf(first);
@@ -196,13 +201,8 @@ ForkedClient loser(const RunningService& service) {
 /// Runs a trace that loses events, and answers what is wrong with what it tells, or "".
 std::string losingRun() {
     const RunningService service({R"(features."AudioAnalytics/Tracing"=true)"});
-    const std::string parameters = service.folder("points.plist");
-    std::ofstream(parameters) << kParameters;
     ServiceClient client = service.client();
-    client.call("createReportingSession", "[42]");
-    client.call("setServiceType", "[11,42]");
-    client.call("setConfiguration", R"([{"VelaReportingKilnPlistFilePath":")" + parameters + R"("},42])");
-    client.call("startReportingSessionForID", "[42]");
+    startTracing(service, client);
     const ForkedClient emitter = loser(service);
     std::string outcome = emitter.report();
     if (outcome != "lost" || client.call("stopReportingSessionForID", "[42]") != "true") {

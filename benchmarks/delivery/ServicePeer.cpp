@@ -1,8 +1,6 @@
 // The built service. Its analytics have no consumer, so that each message becomes exactly one stored row.
 #include "benchmarks/delivery/Peer.h"
 #include "benchmarks/ipc/ServiceProcess.h"
-#include "platform/dbus/MessageReader.h"
-#include "platform/dbus/MessageWriter.h"
 #include "platform/sqlite/SqliteDatabase.h"
 #include "platform/sqlite/StoreReader.h"
 
@@ -25,19 +23,8 @@ struct Account {
 };
 
 Account accountOf(dbus::BlockingConnection& connection) {
-    std::string bytes;
-    const std::uint32_t serial = connection.nextSerial();
-    dbus::MessageWriter writer(bytes);
-    writer.beginCall({.serial = serial,
-                      .path = dbus::kObjectPath,
-                      .interface = dbus::kInspectionInterface,
-                      .member = dbus::kGetLedger});
-    require(writer.finish() && connection.send(bytes), "service: GetLedger");
-    const auto reply = connection.receive(serial, ipcbench::kPatience);
-    require(reply && !reply->isError(), "service: the ledger");
-    const Dictionary ledger = dbus::BodyReader(reply->header).dictionary();
-    const ValueRef totals = ledger.find("totals");
-    const ValueRef beacon = totals.isDictionary() ? totals.dictionary().find("beacon") : ValueRef();
+    const Dictionary totals = ipcbench::ledgerTotals(connection);
+    const ValueRef beacon = totals.find("beacon");
     if (!beacon.isDictionary()) {
         return {};
     }

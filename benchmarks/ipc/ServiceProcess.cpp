@@ -86,6 +86,23 @@ void startSession(dbus::BlockingConnection& connection, std::int64_t reporterID)
     callWithID(connection, dbus::kStartReportingSessionForID, reporterID);
 }
 
+Dictionary ledgerTotals(dbus::BlockingConnection& connection) {
+    std::string bytes;
+    const std::uint32_t serial = connection.nextSerial();
+    dbus::MessageWriter writer(bytes);
+    writer.beginCall({.serial = serial,
+                      .path = dbus::kObjectPath,
+                      .interface = dbus::kInspectionInterface,
+                      .member = dbus::kGetLedger});
+    require(writer.finish() && connection.send(bytes), "service: GetLedger");
+    const auto reply = connection.receive(serial, kPatience);
+    requireGoodReply(reply);
+    const Dictionary ledger = dbus::BodyReader(reply->header).dictionary();
+    const ValueRef totals = ledger.find("totals");
+    require(totals.isDictionary(), "service: the ledger has no totals");
+    return totals.dictionary();
+}
+
 void appendMessage(std::string& bytes, std::uint32_t serial, std::int64_t number, std::int64_t reporterID, bool reply) {
     dbus::MessageWriter writer(bytes);
     writer.beginCall({.serial = serial,
@@ -145,22 +162,10 @@ private:
 
 /// What the service's ledger counts as dropped, of all that it counts as received.
 double lostShareOf(dbus::BlockingConnection& connection) {
-    std::string bytes;
-    const std::uint32_t serial = connection.nextSerial();
-    dbus::MessageWriter writer(bytes);
-    writer.beginCall({.serial = serial,
-                      .path = dbus::kObjectPath,
-                      .interface = dbus::kInspectionInterface,
-                      .member = dbus::kGetLedger});
-    require(writer.finish() && connection.send(bytes), "service: GetLedger");
-    const auto reply = connection.receive(serial, kPatience);
-    requireGoodReply(reply);
-    const Dictionary ledger = dbus::BodyReader(reply->header).dictionary();
-    const ValueRef totals = ledger.find("totals");
-    require(totals.isDictionary(), "service: the ledger has no totals");
+    const Dictionary totals = ledgerTotals(connection);
     double received = 0;
     double kept = 0;
-    for (const auto& [backend, account] : totals.dictionary()) {
+    for (const auto& [backend, account] : totals) {
         const Dictionary counts = account.dictionary();
         received += static_cast<double>(counts.find("received").integerValue());
         for (const char* const outcome : {"delivered", "queued", "redundant"}) {

@@ -2,6 +2,7 @@
 #pragma once
 
 #include "benchmarks/ipc/Subject.h"
+#include "common/values/Dictionary.h"
 #include "platform/dbus/BlockingConnection.h"
 #include "platform/dbus/Protocol.h"
 #include "testing/RunningProgram.h"
@@ -46,6 +47,9 @@ void callWithID(platform::dbus::BlockingConnection& connection, std::string_view
 
 /// A session that is created and started.
 void startSession(platform::dbus::BlockingConnection& connection, std::int64_t reporterID);
+
+/// The sums of the service's ledger, by back end.
+Dictionary ledgerTotals(platform::dbus::BlockingConnection& connection);
 
 /// Appends a call of sendMessage with message `number`.
 void appendMessage(std::string& bytes, std::uint32_t serial, std::int64_t number, std::int64_t reporterID, bool reply);
