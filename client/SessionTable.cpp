@@ -82,10 +82,8 @@ bool SessionTable::create(std::int64_t reporterID) {
 bool SessionTable::configure(Session& session, const CallRecord& record) {
     if (session.configurationBytes + record.bodyBytes > kMostConfigurationBytes) {
         // Much of it may have been replaced since: count what is there.
-        std::string bytes;
-        dbus::MessageWriter(bytes).dictionary(session.configuration);
-        session.configurationBytes = bytes.size();
-        if (bytes.size() + record.bodyBytes > kMostConfigurationBytes) {
+        session.configurationBytes = dbus::MessageWriter::bytesOf(session.configuration);
+        if (session.configurationBytes + record.bodyBytes > kMostConfigurationBytes) {
             return false;
         }
     }

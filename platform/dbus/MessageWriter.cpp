@@ -3,6 +3,7 @@
 #include "common/values/Utf8.h"
 #include "platform/dbus/Names.h"
 
+#include <algorithm>
 #include <bit>
 #include <cassert>
 
@@ -27,16 +28,12 @@ std::string repaired(std::string_view text) {
 
 } // namespace
 
-void MessageWriter::align(std::size_t alignment) {
-    const std::size_t beyond = position() & (alignment - 1);
-    if (beyond != 0) {
-        buffer_.append(alignment - beyond, '\0');
-    }
-}
+void MessageWriter::makeRoom() { buffer_.resize(std::max(end_ + position(), start_ + kFirstRoom)); }
 
 void MessageWriter::begin(MessageType type, std::uint8_t flags, std::uint32_t serial) {
     assert(serial != 0);
     start_ = buffer_.size();
+    end_ = start_;
     tooLarge_ = false;
     byte(static_cast<std::uint8_t>(kNativeOrder));
     byte(static_cast<std::uint8_t>(type));
@@ -126,18 +123,19 @@ void MessageWriter::error(std::string_view name, std::string_view text, ReplyHea
 
 bool MessageWriter::finish() {
     const std::size_t bytes = position();
-    if (tooLarge_ || bytes > kMaximumMessageBytes) {
-        buffer_.resize(start_);
-        return false;
+    const bool fits = !tooLarge_ && bytes <= kMaximumMessageBytes;
+    if (fits) {
+        put32(4, static_cast<std::uint32_t>(bytes - bodyAt_));
+    } else {
+        end_ = start_;
     }
-    put32(4, static_cast<std::uint32_t>(bytes - bodyAt_));
-    return true;
+    buffer_.resize(end_);
+    return fits;
 }
 
 void MessageWriter::validString(std::string_view text) {
     uint32(static_cast<std::uint32_t>(text.size()));
-    buffer_.append(text);
-    buffer_.push_back('\0');
+    text.copy(take(text.size() + 1), text.size());
 }
 
 void MessageWriter::string(std::string_view text) {
@@ -145,13 +143,6 @@ void MessageWriter::string(std::string_view text) {
         return validString(repaired(text));
     }
     validString(text);
-}
-
-void MessageWriter::signature(std::string_view text) {
-    assert(text.size() <= kMaximumSignatureBytes);
-    byte(static_cast<std::uint8_t>(text.size()));
-    buffer_.append(text);
-    buffer_.push_back('\0');
 }
 
 MessageWriter::OpenArray MessageWriter::openArray(std::size_t elementAlignment) {
@@ -172,12 +163,12 @@ void MessageWriter::closeArray(OpenArray array) {
 void MessageWriter::data(std::string_view bytes) {
     tooLarge_ = tooLarge_ || bytes.size() > kMaximumArrayBytes;
     uint32(static_cast<std::uint32_t>(bytes.size()));
-    buffer_.append(bytes);
+    append(bytes);
 }
 
 void MessageWriter::int64s(std::span<const std::int64_t> numbers) {
     const OpenArray array = openArray(alignof(std::int64_t));
-    buffer_.append(reinterpret_cast<const char*>(numbers.data()), numbers.size_bytes());
+    append({reinterpret_cast<const char*>(numbers.data()), numbers.size_bytes()});
     closeArray(array);
 }
 
@@ -196,6 +187,13 @@ void MessageWriter::dictionary(const Dictionary& dictionary) {
         variant(value);
     }
     closeArray(entries);
+}
+
+std::size_t MessageWriter::bytesOf(const Dictionary& dictionary) {
+    std::string bytes;
+    MessageWriter writer(bytes);
+    writer.dictionary(dictionary);
+    return writer.position();
 }
 
 void MessageWriter::array(const Array& array) {

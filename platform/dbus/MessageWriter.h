@@ -6,12 +6,13 @@
 //     writer.int64(reporterID);
 //     if (!writer.finish()) { ... too large; `buffer` is as it was }
 //
-// Confined to its owner's thread; the text outlives it, and nobody else changes it between begin and finish.
+// Confined to its owner's thread; the text outlives it, and nobody else uses it between begin and finish.
 #pragma once
 
 #include "common/values/Dictionary.h"
 #include "platform/dbus/Protocol.h"
 
+#include <cassert>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -68,7 +69,12 @@ public:
     /// s or o. Bytes that are no valid UTF-8, and NUL, become U+FFFD.
     void string(std::string_view text);
     /// g; at most 255 bytes.
-    void signature(std::string_view text);
+    void signature(std::string_view text) {
+        assert(text.size() <= kMaximumSignatureBytes);
+        char* const place = take(text.size() + 2);
+        *place = static_cast<char>(text.size());
+        text.copy(place + 1, text.size());
+    }
     /// ay
     void data(std::string_view bytes);
     /// ax
@@ -83,6 +89,9 @@ public:
     // v of a fixed type, where readers expect one.
     void variantUint16(std::uint16_t value); ///< q
     void variantInt64(std::int64_t value);   ///< x
+
+    /// How many bytes it takes as an argument.
+    static std::size_t bytesOf(const Dictionary& dictionary);
 
     // Arrays piece by piece.
     struct OpenArray {
@@ -99,12 +108,26 @@ public:
     }
 
 private:
+    /// Room for a message of the usual size, made at once.
+    static constexpr std::size_t kFirstRoom = 256;
+
     template <class Number>
     void number(Number value) {
         align(sizeof(value));
-        buffer_.append(reinterpret_cast<const char*>(&value), sizeof(value));
+        std::memcpy(take(sizeof(value)), &value, sizeof(value));
     }
-    void align(std::size_t alignment);
+    void align(std::size_t alignment) { end_ += (alignment - position()) & (alignment - 1); }
+    /// The place of the next so many bytes, which are 0.
+    char* take(std::size_t bytes) {
+        const std::size_t place = end_;
+        end_ += bytes;
+        if (end_ > buffer_.size()) [[unlikely]] {
+            makeRoom();
+        }
+        return buffer_.data() + place;
+    }
+    void append(std::string_view bytes) { bytes.copy(take(bytes.size()), bytes.size()); }
+    void makeRoom();
     void begin(MessageType type, std::uint8_t flags, std::uint32_t serial);
     void field(HeaderField code, std::string_view text, char type = 's');
     void replySerialField(std::uint32_t serial);
@@ -112,10 +135,12 @@ private:
     void array(const Array& array);
     void validString(std::string_view text);
     void put32(std::size_t at, std::uint32_t value) { std::memcpy(&buffer_[start_ + at], &value, sizeof(value)); }
-    std::size_t position() const { return buffer_.size() - start_; }
+    std::size_t position() const { return end_ - start_; }
 
     std::string& buffer_;
-    std::size_t start_ = 0;  ///< of the message in `buffer_`
+    std::size_t start_ = 0; ///< of the message in `buffer_`
+    /// Of what was written. Behind it is room, all 0: padding and ends of strings are there already.
+    std::size_t end_ = 0;
     std::size_t bodyAt_ = 0; ///< from the start of the message
     OpenArray fields_;
     bool tooLarge_ = false;
