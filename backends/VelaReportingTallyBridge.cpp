@@ -3,6 +3,8 @@
 #include "backends/ApplicationName.h"
 #include "common/VelaReportingUtility.h"
 
+#include <array>
+#include <cassert>
 #include <cstddef>
 #include <initializer_list>
 #include <string>
@@ -21,19 +23,22 @@ Dictionary payloadOf(const Dictionary& message, const VelaReportingSession* sess
     return applicationName ? message.setting(VelaReportingApplicationName, std::move(applicationName)) : message;
 }
 
-/// Every message asks for two names: a formatter would take a tenth of its time.
-std::string joined(std::initializer_list<std::string_view> parts) {
-    std::size_t size = 0;
-    for (const std::string_view part : parts) {
-        size += part.size();
+/// Every message asks for two names, of fixed texts: a formatter, or memory of their own, would take a good part of its
+/// time.
+class EventName {
+public:
+    EventName(std::initializer_list<std::string_view> parts) {
+        for (const std::string_view part : parts) {
+            size_ += part.copy(text_.data() + size_, text_.size() - size_);
+        }
+        assert(size_ < text_.size());
     }
-    std::string text;
-    text.reserve(size);
-    for (const std::string_view part : parts) {
-        text += part;
-    }
-    return text;
-}
+    std::string_view view() const { return {text_.data(), size_}; }
+
+private:
+    std::array<char, 128> text_; // filled above
+    std::size_t size_ = 0;
+};
 
 } // namespace
 
@@ -43,17 +48,17 @@ void VelaReportingTallyBridge::handleEvent(const Dictionary& message, std::uint3
         session == nullptr ? std::uint16_t{AudioServiceTypeGeneric} : session->serviceType();
     const std::string categoryName = VelaReportingUtilityCategoryString(category);
     const std::string_view typeName = VelaReportingUtilityTypeString(type);
-    const std::string eventNames[] = {
-        joined({"com.orvex.vela.", categoryName, ".", typeName}),
-        joined({"com.orvex.", VelaReportingUtilityGenerateServiceNameFromServiceType(serviceType), ".", categoryName,
-                ".", typeName}),
+    const EventName eventNames[] = {
+        {"com.orvex.vela.", categoryName, ".", typeName},
+        {"com.orvex.", VelaReportingUtilityGenerateServiceNameFromServiceType(serviceType), ".", categoryName, ".",
+         typeName},
     };
     std::size_t payloadBytes = 0;
-    for (const std::string& eventName : eventNames) {
-        if (tally_.tallyIsEventUsed(eventName)) {
+    for (const EventName& eventName : eventNames) {
+        if (tally_.tallyIsEventUsed(eventName.view())) {
             payloadBytes = payloadBytes == 0 ? memoryOf(message) : payloadBytes;
             tally_.tallySendEventLazy(
-                eventName, [message, session] { return payloadOf(message, session.get()); }, payloadBytes);
+                eventName.view(), [message, session] { return payloadOf(message, session.get()); }, payloadBytes);
         }
     }
 }

@@ -19,7 +19,7 @@ constexpr Nanoseconds kKeepSurplus = 2s;
 
 /// How many items of its own queue a thread runs before it wakes another one for what they made ready: some ten
 /// microseconds' worth, so that many small steps share one wake-up.
-constexpr unsigned kItemsUnshared = 16;
+constexpr unsigned kItemsUnshared = 32;
 
 /// How many items of a less urgent queue run before the thread takes on its priority: to change it and change it back
 /// would cost as much as a few small items.

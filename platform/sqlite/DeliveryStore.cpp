@@ -104,8 +104,8 @@ void DeliveryStore::add(StoreRecord&& record) {
         record.entry->dropped(record.backend, *refused);
         noteLedgerChange();
     }
-    if (refused && record.done) {
-        record.done(false);
+    if (refused && record.done != nullptr) {
+        (*record.done)(false);
     }
 }
 

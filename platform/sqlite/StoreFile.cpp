@@ -198,7 +198,8 @@ StoreFile::Insertion StoreFile::insert(StoreRecord& record, Group& group) {
         return Insertion::Failed;
     }
     const std::string_view values = encode(record.payload, *shape == ShapeTable::kNoShape);
-    const std::int64_t bytes = StoreTable::rowBytes(values.size(), record.name.view().size(), record.bytes.size());
+    const std::int64_t bytes =
+        StoreTable::rowBytes(values.size(), record.name.view().size(), record.bytes.view().size());
     if (bytes > largestRow_) {
         record.refused = DropReason::Limit;
         return Insertion::Done;

@@ -106,7 +106,8 @@ public:
         record.urgency = StoreUrgency::Now;
         record.builder = [snapshot, source = source_] { return snapshot->take(*source); };
         record.builderBytes = kUsualSnapshot;
-        record.done = [snapshot](bool stored) { snapshot->answer(stored); };
+        record.done =
+            std::make_unique<UniqueFunction<void(bool)>>([snapshot](bool stored) { snapshot->answer(stored); });
         store_.add(std::move(record));
     }
 

@@ -28,8 +28,8 @@ std::optional<DropReason> StoreQueue::push(StoreRecord& record) {
         wakes = waiting_ == 1 || waiting_ == limits_.group || record.urgency > urgency_;
         urgency_ = std::max(urgency_, record.urgency);
         awake_ = awake_ || wakes;
-        if (records_.size() == std::max(kPiece, limits_.group)) {
-            pieces_.push_back(std::exchange(records_, std::exchange(spare_, {})));
+        if (records_.size() == pieceSize()) {
+            pieces_.push_back(std::exchange(records_, nextPiece()));
         }
         records_.push_back(std::move(record));
     }
@@ -37,6 +37,17 @@ std::optional<DropReason> StoreQueue::push(StoreRecord& record) {
         writer_.notify_one();
     }
     return std::nullopt;
+}
+
+/// Memory for a whole piece, an emptied one's where there is one.
+std::vector<StoreRecord> StoreQueue::nextPiece() {
+    std::vector<StoreRecord> piece;
+    if (!spare_.empty()) {
+        piece = std::move(spare_.back());
+        spare_.pop_back();
+    }
+    piece.reserve(pieceSize());
+    return piece;
 }
 
 void StoreQueue::noteLedgerChange() {
@@ -82,12 +93,14 @@ StoreQueue::State StoreQueue::state() const {
 
 void StoreQueue::take(std::vector<StoreRecord>& records) {
     assert(records.empty());
+    std::vector<std::vector<StoreRecord>> unused; // given back without the lock
     const std::lock_guard lock(mutex_);
     if (pieces_.empty()) {
         records.swap(records_);
+        unused.swap(spare_);
     } else {
         records.swap(pieces_.front());
-        spare_ = std::move(pieces_.front());
+        spare_.push_back(std::move(pieces_.front()));
         pieces_.pop_front();
     }
     waiting_ -= records.size();

@@ -8,6 +8,7 @@
 
 #include "platform/sqlite/StoreRecord.h"
 
+#include <algorithm>
 #include <atomic>
 #include <condition_variable>
 #include <cstddef>
@@ -26,7 +27,7 @@ public:
         std::size_t bytes = 32 * 1024 * 1024;
         std::size_t group = 64; ///< records that are committed together
     };
-    /// A backlog waits in pieces of so many, whose memory goes round.
+    /// A backlog waits in pieces of so many, whose memory goes round until it is over.
     static constexpr std::size_t kPiece = 4096;
 
     /// What the writer decides by.
@@ -69,6 +70,9 @@ public:
     void wake();
 
 private:
+    std::size_t pieceSize() const { return std::max(kPiece, limits_.group); }
+    std::vector<StoreRecord> nextPiece();
+
     const Limits limits_;
 
     mutable std::mutex mutex_;
@@ -77,7 +81,7 @@ private:
     // Guarded by mutex_.
     std::deque<std::vector<StoreRecord>> pieces_; ///< full ones, the oldest first
     std::vector<StoreRecord> records_;            ///< behind them
-    std::vector<StoreRecord> spare_;              ///< empty; its memory is used next
+    std::vector<std::vector<StoreRecord>> spare_; ///< empty; their memory is used next
     std::size_t waiting_ = 0;
     std::size_t held_ = 0;
     std::size_t heldBytes_ = 0;

@@ -62,7 +62,7 @@ TEST_F(StoreQueueTest, RecordsThatAreBeingWrittenStillTakeRoom) {
 TEST_F(StoreQueueTest, MoreBytesThanItHoldsAreRefused) {
     StoreQueue queue({.records = 100, .bytes = 10'000, .group = 100});
     StoreRecord large = record();
-    large.bytes = std::string(6'000, 'x');
+    large.bytes = Data(std::string(6'000, 'x'));
     EXPECT_EQ(push(queue, std::move(large)), std::nullopt);
     StoreRecord second = record();
     second.payload = {{"text", std::string_view(std::string(6'000, 'y'))}};
@@ -73,9 +73,9 @@ TEST_F(StoreQueueTest, MoreBytesThanItHoldsAreRefused) {
 TEST_F(StoreQueueTest, ARecordLargerThanAllItsRoomIsRefusedForItsSize) {
     StoreQueue queue({.records = 100, .bytes = 1'000, .group = 100});
     StoreRecord large = record();
-    large.bytes = std::string(1'000, 'x');
+    large.bytes = Data(std::string(1'000, 'x'));
     EXPECT_EQ(queue.push(large), DropReason::Limit);
-    EXPECT_EQ(large.bytes.size(), 1'000U);
+    EXPECT_EQ(large.bytes.view().size(), 1'000U);
     EXPECT_EQ(queue.held(), 0U);
 }
 

@@ -11,7 +11,6 @@
 #include <cstdint>
 #include <memory>
 #include <optional>
-#include <string>
 #include <string_view>
 
 namespace vela::platform {
@@ -56,14 +55,14 @@ struct StoreRecord {
     std::optional<std::uint16_t> type;
     std::optional<std::uint32_t> number; ///< Joule: the client's; Telem: the metric's
     String name;                         ///< empty for none
-    std::string bytes;                   ///< Telem: the record in its wire format
+    Data bytes;                          ///< Telem: the record in its wire format
     Dictionary payload;
 
     /// Makes the payload on the writer's thread, called once at the most.
     UniqueFunction<Dictionary()> builder;
     std::size_t builderBytes = 0; ///< about what it holds, and what the payload will
-    /// Called on the writer's thread with what became of the record.
-    UniqueFunction<void(bool stored)> done;
+    /// Called on the writer's thread with what became of the record. Hardly any has it: it takes no room in the others.
+    std::unique_ptr<UniqueFunction<void(bool stored)>> done;
     /// Whose outcome is counted; null for marks.
     std::shared_ptr<LedgerEntry> entry;
 
@@ -74,7 +73,7 @@ struct StoreRecord {
 
 /// Bytes that a record holds while it waits.
 inline std::size_t weightOf(const StoreRecord& record) {
-    return sizeof(StoreRecord) + record.name.view().size() + record.bytes.size() + memoryOf(record.payload) +
+    return sizeof(StoreRecord) + record.name.view().size() + record.bytes.view().size() + memoryOf(record.payload) +
            record.builderBytes;
 }
 

@@ -75,8 +75,8 @@ bool StoreTable::insert(const StoreRecord& record, const StoreRow& row) {
     waitingValues_ += row.values;
     waiting_.push_back({&record, row.seq, row.shape, begin, waitingValues_.size()});
     ++usage_.rows;
-    usage_.bytes +=
-        rowBytes(row.values.size(), isNamed(record, row.shape) ? record.name.view().size() : 0, record.bytes.size());
+    usage_.bytes += rowBytes(row.values.size(), isNamed(record, row.shape) ? record.name.view().size() : 0,
+                             record.bytes.view().size());
     return (waiting_.size() < kRowsTogether.front() && waitingValues_.size() < kBytesTogether) || writeRows();
 }
 
@@ -149,7 +149,7 @@ void StoreTable::bind(Insertion& insertion, std::size_t place, const WaitingRow&
     bindWhereOther(record.number, bound.number);
     statement.bindText(++column, std::string_view(waitingValues_).substr(row.begin, row.end - row.begin));
     bindIfAny(record.operation == StoreOperation::Post, bound.hasRecord,
-              [&] { statement.bindBytes(column, record.bytes); });
+              [&] { statement.bindBytes(column, record.bytes.view()); });
 }
 
 bool StoreTable::evict(std::int64_t bytes) {

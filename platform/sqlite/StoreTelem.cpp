@@ -7,7 +7,7 @@ namespace vela::platform {
 void StoreTelem::telemPostMetric(std::uint32_t metricIdentifier, std::string_view record, const Dictionary& fields) {
     StoreRecord delivery = store_.newDelivery(DeliveryBackend::Telem, StoreOperation::Post);
     delivery.number = metricIdentifier;
-    delivery.bytes = record;
+    delivery.bytes = Data(record);
     delivery.payload = fields;
     store_.add(std::move(delivery));
 }

@@ -198,8 +198,8 @@ void StoreWriter::settle(std::span<StoreRecord> group, bool stored) {
             each.entry->dropped(each.backend, each.refused.value_or(DropReason::StoreFailed));
             lostSince_ += stored ? 0 : 1;
         }
-        if (each.done) {
-            each.done(kept);
+        if (each.done != nullptr) {
+            (*each.done)(kept);
         }
     }
     settled_ += group.size();

@@ -232,7 +232,8 @@ TEST_F(StoreWriterTest, ABacklogOfRecordsThatBecomeLongIsStoredWhole) {
         StoreRecord record;
         record.payload = {{"text", std::string_view(std::string(10'000, '\x01'))}};
         record.entry = entry_;
-        record.done = [&outcomes](bool stored) { outcomes.push_back(stored); };
+        record.done =
+            std::make_unique<UniqueFunction<void(bool)>>([&outcomes](bool stored) { outcomes.push_back(stored); });
         entry_->received(DeliveryBackend::Beacon);
         ASSERT_EQ(queue.push(record), std::nullopt);
     }
@@ -318,7 +319,8 @@ TEST_F(StoreWriterTest, BuildersOfADroppedGroupAreCalledAtMostOnce) {
         ++built;
         return Dictionary();
     };
-    record.done = [&outcomes](bool stored) { outcomes.push_back(stored); };
+    record.done =
+        std::make_unique<UniqueFunction<void(bool)>>([&outcomes](bool stored) { outcomes.push_back(stored); });
     ASSERT_EQ(queue_.push(record), std::nullopt);
     run(0);
     disk_.fail(SQLITE_OK);
