@@ -124,28 +124,24 @@ Result<Reply> BlockingConnection::receive(std::uint32_t serial, Nanoseconds pati
     }
 }
 
-// Waits for bytes, in one call of the system: a waiting client's time is spent in those.
+// Waits by `ppoll`: a reading that waits is woken also whenever the service reads, and goes to sleep again for nothing.
 Result<Done> BlockingConnection::takeIn(Nanoseconds patience) {
-    if (patience != patience_) {
-        // No time at all would mean for ever.
-        const auto time =
-            std::max(std::chrono::ceil<std::chrono::microseconds>(patience), std::chrono::microseconds(1));
-        const auto seconds = std::chrono::floor<std::chrono::seconds>(time);
-        const timeval limit{seconds.count(), (time - seconds).count()};
-        if (setsockopt(descriptor_.get(), SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof(limit)) != 0) {
-            return systemFailure("waiting for the service", errno);
-        }
-        patience_ = patience;
-    }
-    ssize_t got = -1;
+    const Nanoseconds time = std::max(patience, Nanoseconds::zero());
+    const auto seconds = std::chrono::floor<std::chrono::seconds>(time);
+    const timespec limit{seconds.count(), (time - seconds).count()};
+    pollfd waiting{descriptor_.get(), POLLIN, 0};
+    int ready = -1;
     do {
-        got = ::recv(descriptor_.get(), scratch_.data(), scratch_.size(), 0);
-    } while (got < 0 && errno == EINTR);
-    if (got < 0 && errno == EAGAIN) {
+        ready = ::ppoll(&waiting, 1, &limit, nullptr);
+    } while (ready < 0 && errno == EINTR);
+    if (ready < 0) {
+        return systemFailure("waiting for the service", errno);
+    }
+    if (ready == 0) {
         return Failure{ETIMEDOUT, "no answer within " +
                                       std::to_string(std::chrono::duration<double>(patience).count()) + " seconds"};
     }
-    return keep(got);
+    return takeWhatIsThere();
 }
 
 Result<Done> BlockingConnection::takeWhatIsThere() {

@@ -61,7 +61,6 @@ private:
     static constexpr std::size_t kReadBytes = 16 * 1024;
 
     FileDescriptor descriptor_;
-    Nanoseconds patience_{-1};   ///< of the socket, for what comes in; none at first
     bool authenticated_ = false; ///< what comes in are messages
     std::uint32_t serial_ = 0;
     std::vector<char> scratch_ = std::vector<char>(kReadBytes); ///< what a reading fills

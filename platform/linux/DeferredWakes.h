@@ -3,8 +3,9 @@
 // not wait for anything while the object lives.
 #pragma once
 
+#include "platform/linux/Sleeper.h"
+
 #include <array>
-#include <condition_variable>
 #include <cstddef>
 
 namespace vela::platform {
@@ -16,16 +17,16 @@ public:
     ~DeferredWakes() {
         current_ = outer_;
         for (std::size_t index = 0; index < count_; ++index) {
-            sleepers_[index]->notify_one();
+            sleepers_[index]->wake();
         }
     }
     DeferredWakes(const DeferredWakes&) = delete;
     DeferredWakes& operator=(const DeferredWakes&) = delete;
 
-    /// Wakes the one thread that sleeps on `sleeper`, which must live on: at once, or when the calling thread is done.
-    static void wake(std::condition_variable& sleeper) {
+    /// Wakes `sleeper`, which must live on: at once, or when the calling thread is done.
+    static void wake(Sleeper& sleeper) {
         if (current_ == nullptr || current_->count_ == current_->sleepers_.size()) {
-            sleeper.notify_one();
+            sleeper.wake();
         } else {
             current_->sleepers_[current_->count_++] = &sleeper;
         }
@@ -36,7 +37,7 @@ private:
     static inline constinit thread_local DeferredWakes* current_ = nullptr;
 
     DeferredWakes* const outer_;
-    std::array<std::condition_variable*, 8> sleepers_{};
+    std::array<Sleeper*, 8> sleepers_{};
     std::size_t count_ = 0;
 };
 

@@ -24,9 +24,16 @@ bool PoolLock::wait(std::condition_variable& condition, const std::optional<Mono
     return condition.wait_until(lock_, *deadline) == std::cv_status::no_timeout;
 }
 
+bool PoolLock::sleep(Sleeper& sleeper, const std::optional<MonotonicTime>& deadline) {
+    unlock();
+    const bool woken = sleeper.sleepUntil(deadline.value_or(MonotonicTime::max()));
+    relock();
+    return woken;
+}
+
 void PoolLock::wakeOnUnlock(Worker& worker) {
     if (wakeCount_ == wakes_.size()) {
-        worker.wake.notify_one();
+        worker.sleeper.wake();
         return;
     }
     wakes_[wakeCount_++] = &worker;
@@ -34,7 +41,7 @@ void PoolLock::wakeOnUnlock(Worker& worker) {
 
 void PoolLock::wakeNow() {
     for (; wakeCount_ > 0; --wakeCount_) {
-        DeferredWakes::wake(wakes_[wakeCount_ - 1]->wake);
+        DeferredWakes::wake(wakes_[wakeCount_ - 1]->sleeper);
     }
 }
 

@@ -12,6 +12,7 @@
 
 namespace vela::platform {
 
+class Sleeper;
 class WorkerPool;
 struct Worker;
 
@@ -27,6 +28,9 @@ public:
 
     /// Waits, with the lock let go meanwhile; may end without cause. False when `deadline` has passed.
     bool wait(std::condition_variable& condition, const std::optional<MonotonicTime>& deadline);
+
+    /// As `wait`, asleep.
+    bool sleep(Sleeper& sleeper, const std::optional<MonotonicTime>& deadline);
 
     /// `worker` lives as long as its pool.
     void wakeOnUnlock(Worker& worker);

@@ -1,9 +1,9 @@
 // One thread of a worker pool. Confined to it, save for what the pool's lock guards. Lives as long as its pool.
 #pragma once
 
+#include "platform/linux/Sleeper.h"
 #include "platform/linux/ThreadAttributes.h"
 
-#include <condition_variable>
 #include <thread>
 
 namespace vela::platform {
@@ -13,9 +13,10 @@ class WorkerPool;
 
 struct Worker {
     // Guarded by the pool's lock:
-    std::condition_variable wake;
     bool woken = false;
     std::thread thread;
+
+    Sleeper sleeper;
 
     // The thread's own:
     WorkerPool* pool = nullptr;

@@ -52,7 +52,7 @@ void WorkerPool::stop() {
     PoolLock lock(*this);
     stopping_ = true;
     for (const auto& worker : workers_) {
-        worker->wake.notify_one();
+        worker->sleeper.wake();
     }
     while (total_ > 0) {
         lock.wait(turnEnded_, std::nullopt);
@@ -243,7 +243,7 @@ bool WorkerPool::rest(PoolLock& lock, Worker& self) {
     }
     --active_;
     while (!self.woken && !stopping_) {
-        if (!lock.wait(self.wake, until)) {
+        if (!lock.sleep(self.sleeper, until)) {
             break;
         }
     }
