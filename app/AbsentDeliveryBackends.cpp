@@ -14,6 +14,7 @@ public:
     platform::Telem& telem() override { return telem_; }
     platform::Malady& malady() override { return malady_; }
     void setInspection(const platform::ServiceInspection&) override {}
+    bool isBehind() const override { return false; }
     void close() override {}
 
 private:

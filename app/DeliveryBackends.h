@@ -33,6 +33,9 @@ public:
     /// What snapshots tell of the service's sessions; none before. `inspection` outlives this.
     virtual void setInspection(const platform::ServiceInspection& inspection) = 0;
 
+    /// Whether deliveries come faster than they are stored, and hardly find room any more.
+    virtual bool isBehind() const = 0;
+
     /// Makes durable what was delivered so far, and takes nothing more. Blocks until it is done.
     virtual void close() = 0;
 };

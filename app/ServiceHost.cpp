@@ -136,6 +136,7 @@ platform::DbusServiceOptions ServiceHost::endpointOptions() {
     options.sessionsPerClient = settings_.limits.sessionsPerClient;
     options.clientsPerUser = settings_.limits.clientsPerUser;
     options.unsentReplies = settings_.limits.unsentReplies;
+    options.isBehind = [this] { return backends_->isBehind(); };
     if (const auto limit = manager_.watchdogLimit()) {
         options.interval = std::chrono::duration_cast<std::chrono::milliseconds>(*limit / 2);
         options.periodic = [this] { static_cast<void>(manager_.tellAlive()); };

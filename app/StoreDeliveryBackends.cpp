@@ -32,6 +32,7 @@ public:
     platform::Telem& telem() override { return telem_; }
     platform::Malady& malady() override { return malady_; }
     void setInspection(const platform::ServiceInspection& inspection) override { inspection_ = &inspection; }
+    bool isBehind() const override { return store_->isBehind(); }
     void close() override { store_->close(); }
 
 private:

@@ -54,7 +54,7 @@ public:
     enum class Turn : std::uint8_t {
         Waiting, ///< for the socket, or for the channel to ring
         More,    ///< there is more to do at once
-        Soon,    ///< it gathers: to be looked at again after kGatheringTime, whatever the socket says
+        Soon,    ///< it gathers: to be looked at again after a while, whatever the socket says
         Ended,   ///< to be ended
     };
     /// Reads once at most and dispatches up to kMessagesPerTurn messages, so that no client keeps the others waiting.
@@ -67,6 +67,8 @@ public:
     void abandon();
     void writable() { channel_->writable(); }
 
+    /// Whether the next turn is the first of a look while it gathers.
+    bool beginsLook() const { return gathering_ && !looking_; }
     bool isAuthenticating() const { return state_ == State::Authenticating; }
     bool isRefused() const { return refused_; }
     std::uint32_t user() const { return target_.peer.user; }
@@ -74,12 +76,16 @@ public:
 
     bool queued = false; ///< for its next turn, by the endpoint
     bool soon = false;   ///< for its next look, by the endpoint
+    bool due = false;    ///< the time of that look has come
 
     static constexpr int kMessagesPerTurn = 8;
 
     // A client that does not wait for each reply is looked at from time to time, so that its calls and their replies
     // share wake-ups, which cost more than the calls do. It goes on for as long as it pays.
     static constexpr Nanoseconds kGatheringTime = std::chrono::microseconds(200);
+    /// The same while the service is behind: 128 calls each time are 32,000 a second, a fifth of what the store takes
+    /// in on two small processors.
+    static constexpr Nanoseconds kBehindTime = std::chrono::milliseconds(4);
     /// Messages that a look must find.
     static constexpr unsigned kWorthGathering = 4;
     /// Messages between two attempts.

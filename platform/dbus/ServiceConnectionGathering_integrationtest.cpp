@@ -2,6 +2,7 @@
 // the test's own, so that nothing depends on time.
 #include "platform/dbus/ServiceEndpoint_integrationtest.h"
 
+#include <algorithm>
 #include <array>
 
 namespace vela::platform::dbus {
@@ -318,6 +319,50 @@ TEST(ServiceEndpointGatheringTest, ManyCallsAreAnsweredInOrderByAnotherThread) {
     sending.join();
     done = true;
     answering.join();
+}
+
+TEST(ServiceEndpointGatheringTest, WhileTheServiceIsBehindManyCallsUnderWayAreReadFromTimeToTimeOnly) {
+    constexpr std::uint32_t kRounds = 12;
+    constexpr std::uint32_t kTogether = 50;
+    DbusServiceOptions options;
+    options.isBehind = [] { return true; };
+    options.callsInFlight = kTogether;
+    RunningEndpoint endpoint(std::move(options));
+    endpoint.service->keepReplies();
+    RawClient client = endpoint.client();
+    std::string all;
+    for (std::uint32_t serial = 1; serial <= kRounds * kTogether; ++serial) {
+        all += simpleCall("stopReportingSessionForID", serial, serial);
+    }
+    client.send(all);
+    const auto begin = std::chrono::steady_clock::now();
+    std::vector<UniqueFunction<void()>> replies;
+    for (std::uint32_t round = 0; round < kRounds; ++round) {
+        while (replies.size() < kTogether) {
+            std::ranges::move(endpoint.service->takeReplies(), std::back_inserter(replies));
+        }
+        for (auto& reply : std::exchange(replies, {})) {
+            reply();
+        }
+    }
+    // The first two rounds are not gathered. Where this thread was slow, gathering ends with a look that found nothing,
+    // and two further rounds come at once.
+    EXPECT_GE(std::chrono::steady_clock::now() - begin, (kRounds - 2) / 3 * ServiceConnection::kBehindTime);
+    for (std::uint32_t serial = 1; serial <= kRounds * kTogether; ++serial) {
+        ASSERT_EQ(client.readMessage().header.replySerial, serial);
+    }
+}
+
+TEST(ServiceEndpointGatheringTest, AClientThatWaitsIsServedAtOnceWhileTheServiceIsBehind) {
+    DbusServiceOptions options;
+    std::atomic<int> asked = 0;
+    options.isBehind = [&asked] { return ++asked > 0; };
+    RunningEndpoint endpoint(std::move(options));
+    RawClient client = endpoint.client();
+    for (std::uint32_t serial = 1; serial <= 200; ++serial) {
+        ASSERT_EQ(client.call(simpleCall("stopReportingSessionForID", serial, serial)).header.replySerial, serial);
+    }
+    EXPECT_EQ(asked, 0);
 }
 
 } // namespace

@@ -225,7 +225,8 @@ void DbusServiceEndpoint::queue(const std::shared_ptr<dbus::ServiceConnection>& 
 
 void DbusServiceEndpoint::queueSoon(const std::shared_ptr<dbus::ServiceConnection>& connection) {
     if (soon_.empty()) {
-        soonAt_ = std::chrono::steady_clock::now() + dbus::ServiceConnection::kGatheringTime;
+        soonAt_ = std::chrono::steady_clock::now() +
+                  (isBehind() ? dbus::ServiceConnection::kBehindTime : dbus::ServiceConnection::kGatheringTime);
     }
     if (!std::exchange(connection->soon, true)) {
         soon_.push_back(connection);
@@ -238,6 +239,7 @@ void DbusServiceEndpoint::queueThoseDue() {
     }
     for (const auto& connection : soon_) {
         connection->soon = false;
+        connection->due = true;
         queue(connection);
     }
     soon_.clear();
@@ -254,6 +256,10 @@ void DbusServiceEndpoint::runRung() {
 void DbusServiceEndpoint::runQueued() {
     for (const auto& connection : std::exchange(queued_, {})) {
         connection->queued = false;
+        if (!std::exchange(connection->due, false) && connection->beginsLook() && isBehind()) {
+            queueSoon(connection);
+            continue;
+        }
         switch (connection->turn(scratch_, *delegate_)) {
         case dbus::ServiceConnection::Turn::Waiting:
             break;

@@ -9,6 +9,7 @@
 //  - messageBytes, valueDepth, sessionsPerClient: that call is answered with LimitsExceeded, nothing else happens;
 //  - callsInFlight, messageBytes for all calls in flight together, unsentReplies: the client is not read from until it
 //    is below the half again.
+// While the service is behind, a client with many calls under way is read from every kBehindTime only.
 #pragma once
 
 #include "platform/Ipc.h"
@@ -51,6 +52,9 @@ struct DbusServiceOptions {
 
     /// Whether SIGTERM and SIGINT end `resume`. Other threads must have them blocked: see blockEndSignals.
     bool endsOnSignals = true;
+    /// Whether what clients send comes faster than it can be worked off: those with many calls under way are read from
+    /// less often then. Called on the endpoint's thread; may be none.
+    UniqueFunction<bool()> isBehind;
     /// Called on the endpoint's thread after each round of events; may be none.
     UniqueFunction<void()> onLoopTurn;
     /// Called on the endpoint's thread every `interval`, for the service manager's watchdog; without it nothing wakes
@@ -116,6 +120,7 @@ private:
     void queue(const std::shared_ptr<dbus::ServiceConnection>& connection);
     void queueSoon(const std::shared_ptr<dbus::ServiceConnection>& connection);
     void queueThoseDue();
+    bool isBehind() { return options_.isBehind && options_.isBehind(); }
     void runQueued();
     void runRung();
     void endLateAuthentications();

@@ -49,6 +49,8 @@ public:
     void close();
 
     StoreStatus status() const { return writer_.status(); }
+    /// Whether it would soon have no room for more, and will have it again: not while the disk fails.
+    bool isBehind() const { return queue_.isNearlyFull() && !status().degraded; }
 
     /// The account of what the calling thread delivers: that of its LedgerScope, or the service's own.
     const std::shared_ptr<LedgerEntry>& account() const;

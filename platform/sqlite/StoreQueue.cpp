@@ -86,6 +86,11 @@ std::size_t StoreQueue::held() const {
     return held_;
 }
 
+bool StoreQueue::isNearlyFull() const {
+    const std::lock_guard lock(mutex_);
+    return held_ >= limits_.records - limits_.records / 8 || heldBytes_ >= limits_.bytes - limits_.bytes / 8;
+}
+
 StoreQueue::State StoreQueue::state() const {
     const std::lock_guard lock(mutex_);
     return {waiting_, urgency_, ledgerChanged_.load(), closed_, flush_};

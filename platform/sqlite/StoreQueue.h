@@ -53,6 +53,8 @@ public:
 
     /// Records that are held, those being written among them.
     std::size_t held() const;
+    /// Whether an eighth or less of its room is free.
+    bool isNearlyFull() const;
 
     State state() const;
     /// The oldest that wait, at most kPiece or one group, in the order pushed. `records` is empty before; its memory

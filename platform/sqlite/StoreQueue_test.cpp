@@ -59,6 +59,31 @@ TEST_F(StoreQueueTest, RecordsThatAreBeingWrittenStillTakeRoom) {
     EXPECT_EQ(queue_.held(), 4U);
 }
 
+TEST_F(StoreQueueTest, ItIsNearlyFullWhenAnEighthOfItsRecordsIsLeft) {
+    StoreQueue queue({.records = 16, .bytes = 1024 * 1024, .group = 100});
+    for (int count = 0; count < 13; ++count) {
+        push(queue, record());
+    }
+    EXPECT_FALSE(queue.isNearlyFull());
+    push(queue, record());
+    EXPECT_TRUE(queue.isNearlyFull());
+    std::vector<StoreRecord> taken;
+    queue.take(taken);
+    EXPECT_TRUE(queue.isNearlyFull());
+    queue.release(1, taken[0].weight);
+    EXPECT_FALSE(queue.isNearlyFull());
+}
+
+TEST_F(StoreQueueTest, ItIsNearlyFullWhenAnEighthOfItsBytesIsLeft) {
+    StoreQueue queue({.records = 100, .bytes = 8'000, .group = 100});
+    StoreRecord large = record();
+    large.bytes = Data(std::string(7'000 - sizeof(StoreRecord) - 1, 'x'));
+    push(queue, std::move(large));
+    EXPECT_FALSE(queue.isNearlyFull());
+    push(queue, record());
+    EXPECT_TRUE(queue.isNearlyFull());
+}
+
 TEST_F(StoreQueueTest, MoreBytesThanItHoldsAreRefused) {
     StoreQueue queue({.records = 100, .bytes = 10'000, .group = 100});
     StoreRecord large = record();
