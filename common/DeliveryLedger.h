@@ -76,7 +76,7 @@ public:
 
     LedgerCounts counts(DeliveryBackend backend) const;
     /// Whether anything was counted since the last call.
-    bool takeChange() { return changed_.exchange(false); }
+    bool takeChange() { return changed_.load(std::memory_order_relaxed) && changed_.exchange(false); }
 
     const std::int32_t client;     ///< pid, or kEarlierClient
     const std::int64_t reporterID; ///< 0 for what belongs to no session

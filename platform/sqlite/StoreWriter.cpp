@@ -24,6 +24,36 @@ void keepEarlier(std::optional<MonotonicTime>& time, MonotonicTime other) {
     time = time ? std::min(*time, other) : other;
 }
 
+/// Counts deliveries of the same account together: meanwhile its session counts in the same place, on another
+/// processor.
+class DeliveredCounts {
+public:
+    DeliveredCounts() = default;
+    DeliveredCounts(const DeliveredCounts&) = delete;
+    DeliveredCounts& operator=(const DeliveredCounts&) = delete;
+    ~DeliveredCounts() { tell(); }
+
+    /// `entry` lives until `tell`.
+    void add(LedgerEntry& entry, DeliveryBackend backend) {
+        if (entry_ != &entry) {
+            tell();
+            entry_ = &entry;
+        }
+        ++counts_[static_cast<std::size_t>(backend)];
+    }
+    void tell() {
+        for (std::size_t number = 0; number < counts_.size(); ++number) {
+            if (const std::uint64_t count = std::exchange(counts_[number], 0); count > 0) {
+                entry_->delivered(static_cast<DeliveryBackend>(number), count);
+            }
+        }
+    }
+
+private:
+    LedgerEntry* entry_ = nullptr;
+    std::array<std::uint64_t, kDeliveryBackends> counts_{};
+};
+
 } // namespace
 
 StoreWriter::StoreWriter(Options options, StoreQueue& queue, DeliveryLedger& ledger)
@@ -189,19 +219,22 @@ Result<std::size_t> StoreWriter::attempt(std::span<StoreRecord> group) {
 
 void StoreWriter::settle(std::span<StoreRecord> group, bool stored) {
     std::size_t bytes = 0;
+    DeliveredCounts delivered;
     for (StoreRecord& each : group) {
         bytes += each.weight;
         const bool kept = stored && !each.refused;
         if (each.entry != nullptr && kept) {
-            each.entry->delivered(each.backend);
+            delivered.add(*each.entry, each.backend);
         } else if (each.entry != nullptr) {
             each.entry->dropped(each.backend, each.refused.value_or(DropReason::StoreFailed));
             lostSince_ += stored ? 0 : 1;
         }
         if (each.done != nullptr) {
+            delivered.tell();
             (*each.done)(kept);
         }
     }
+    delivered.tell();
     settled_ += group.size();
     // What the queue has room for again must not be held here any more, while commits fail say.
     if (settled_ == taken_.size()) {
