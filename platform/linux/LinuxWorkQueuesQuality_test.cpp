@@ -111,7 +111,7 @@ TEST(LinuxWorkQueuesQualityTest, WhatAnItemPostsElsewhereRunsBesideItsQueueThatG
     const auto other = queues.makeSerialQueue("other", QualityOfService::Default);
     one->post(gate.item());
     one->post([&] { other->post([&ran] { ran.set_value(); }); });
-    for (int i = 0; i < 15; ++i) {
+    for (int i = 0; i < 31; ++i) {
         one->post([] {});
     }
     one->post([&] { seen.set_value(ran.get_future().wait_for(60s) == std::future_status::ready); });
