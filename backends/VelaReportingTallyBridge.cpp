@@ -25,9 +25,9 @@ Dictionary payloadOf(const Dictionary& message, const VelaReportingSession* sess
 
 /// Every message asks for two names, of fixed texts: a formatter, or memory of their own, would take a good part of its
 /// time.
-class EventName {
+class VelaReportingEventName {
 public:
-    EventName(std::initializer_list<std::string_view> parts) {
+    VelaReportingEventName(std::initializer_list<std::string_view> parts) {
         for (const std::string_view part : parts) {
             size_ += part.copy(text_.data() + size_, text_.size() - size_);
         }
@@ -48,13 +48,13 @@ void VelaReportingTallyBridge::handleEvent(const Dictionary& message, std::uint3
         session == nullptr ? std::uint16_t{AudioServiceTypeGeneric} : session->serviceType();
     const std::string categoryName = VelaReportingUtilityCategoryString(category);
     const std::string_view typeName = VelaReportingUtilityTypeString(type);
-    const EventName eventNames[] = {
+    const VelaReportingEventName eventNames[] = {
         {"com.orvex.vela.", categoryName, ".", typeName},
         {"com.orvex.", VelaReportingUtilityGenerateServiceNameFromServiceType(serviceType), ".", categoryName, ".",
          typeName},
     };
     std::size_t payloadBytes = 0;
-    for (const EventName& eventName : eventNames) {
+    for (const VelaReportingEventName& eventName : eventNames) {
         if (tally_.tallyIsEventUsed(eventName.view())) {
             payloadBytes = payloadBytes == 0 ? memoryOf(message) : payloadBytes;
             tally_.tallySendEventLazy(

@@ -8,24 +8,45 @@ namespace vela {
 
 using Steps = std::vector<std::string>;
 
+/// A message as a bridge or issue capture got it.
+struct Handled {
+    Dictionary message;
+    std::uint32_t category = 0;
+    std::uint32_t type = 0;
+
+    friend bool operator==(const Handled&, const Handled&) = default;
+};
+
 /// Notes "tally 42".
 struct RecordingBridge final : VelaReportingSessionEventHandler {
-    RecordingBridge(std::string itsName, Steps& itsSteps) : name(std::move(itsName)), steps(itsSteps) {}
+    RecordingBridge(std::string itsName, Steps& itsSteps, std::vector<Handled>& itsHandled)
+        : name(std::move(itsName)),
+          steps(itsSteps),
+          handled(itsHandled) {}
 
-    void handleEvent(const Dictionary&, std::uint32_t, std::uint32_t,
+    void handleEvent(const Dictionary& message, std::uint32_t category, std::uint32_t type,
                      const std::shared_ptr<VelaReportingSession>& session) override {
         steps.push_back(name + " " + std::to_string(session->reporterID()));
+        handled.push_back({message, category, type});
     }
 
     const std::string name;
     Steps& steps;
+    std::vector<Handled>& handled;
 };
+
+/// What a step that may take long adds to its note.
+inline std::string blockingIn(const testing::ManualWorkQueues& queues) {
+    return queues.blockingDepth() > 0 ? ", blocking" : "";
+}
 
 /// The service as one client sees it, with answers that a test sets.
 struct RecordingDelegate final : VelaReportingServiceDelegateProtocol {
-    RecordingDelegate(platform::WorkQueues& queues, Steps& itsSteps)
-        : queue(queues.makeSerialQueue("com.orvex.vela.test", platform::QualityOfService::UserInteractive)),
-          steps(itsSteps) {}
+    RecordingDelegate(testing::ManualWorkQueues& itsQueues, Steps& itsSteps, std::vector<Handled>& itsHandled)
+        : queues(itsQueues),
+          queue(itsQueues.makeSerialQueue("com.orvex.vela.test", platform::QualityOfService::UserInteractive)),
+          steps(itsSteps),
+          handled(itsHandled) {}
 
     platform::SerialQueue& reportingQueue() const override { return *queue; }
     Sessions getAllActiveReportingSessions() const override {
@@ -41,7 +62,8 @@ struct RecordingDelegate final : VelaReportingServiceDelegateProtocol {
     }
     const Clients& getAllClients() const override { return clients; }
     void removeClient(const VelaReportingClientServerInstance& client) override {
-        steps.push_back("remove " + std::to_string(client.processIdentifier()));
+        steps.push_back("remove " + std::to_string(client.processIdentifier()) +
+                        (client.clientReportingSessions().empty() ? "" : " with its sessions"));
         clients.clear();
     }
     const Dictionary& getDefaults() const override { return defaults; }
@@ -52,26 +74,29 @@ struct RecordingDelegate final : VelaReportingServiceDelegateProtocol {
         steps.push_back("count " + std::to_string(count));
     }
     VelaReportingDriverSnapShot getSnapShot() const override {
-        steps.emplace_back("snapshot");
+        steps.push_back("snapshot" + blockingIn(queues));
         return {{"Haptics-Stats", nullptr}};
     }
     void sendDriverLogsForSession(const std::shared_ptr<VelaReportingSession>& session) const override {
         steps.push_back("driver logs " + std::to_string(session->reporterID()) +
-                        (session->driverSnapShot() ? "" : " without a snapshot"));
+                        (session->driverSnapShot() ? "" : " without a snapshot") + blockingIn(queues));
     }
     std::optional<Dictionary> getFeaturesState() const override {
         steps.emplace_back("features");
         return features;
     }
     void listenForFeatureStateChanges() override {}
-    void handleEventForSnag(const Dictionary&, std::uint32_t, std::uint32_t,
+    void handleEventForSnag(const Dictionary& message, std::uint32_t category, std::uint32_t type,
                             const std::shared_ptr<VelaReportingSession>& session,
                             const std::optional<std::string>& processName) override {
         steps.push_back("snag " + std::to_string(session->reporterID()) + " of " + processName.value_or("nobody"));
+        handled.push_back({message, category, type});
     }
 
+    const testing::ManualWorkQueues& queues;
     const std::unique_ptr<platform::SerialQueue> queue;
     Steps& steps;
+    std::vector<Handled>& handled;
     Sessions active;
     Sessions others; ///< of other clients
     Clients clients;
@@ -90,11 +115,11 @@ protected:
             } else if (code == kTraceSend) {
                 steps_.emplace_back("session sends");
             } else if (code == kTraceStop) {
-                steps_.emplace_back("session stops");
+                steps_.push_back("session stops" + blockingIn(queues_));
             }
         });
         client_.connection->setExportedObject(
-            VelaReportingClientServerInstance::initWithPID(7, recordingDelegate_, context_));
+            VelaReportingClientServerInstance::initWithPID(7, recordingDelegate_, context_, {}, client_.connection));
         connections_.push_back(client_.connection);
     }
     void TearDown() override {
@@ -115,10 +140,13 @@ protected:
     Steps steps() { return std::exchange(steps_, {}); }
 
     Steps steps_;
+    std::vector<Handled> handled_;
     std::shared_ptr<const VelaReportingServiceContext> context_ = std::make_shared<const VelaReportingServiceContext>(
-        VelaReportingServicePlatform{platform_}, std::make_unique<RecordingBridge>("tally", steps_),
-        std::make_unique<RecordingBridge>("joule", steps_), std::make_unique<RecordingBridge>("telem", steps_));
-    std::shared_ptr<RecordingDelegate> recordingDelegate_ = std::make_shared<RecordingDelegate>(queues_, steps_);
+        VelaReportingServicePlatform{platform_}, std::make_unique<RecordingBridge>("tally", steps_, handled_),
+        std::make_unique<RecordingBridge>("joule", steps_, handled_),
+        std::make_unique<RecordingBridge>("telem", steps_, handled_));
+    std::shared_ptr<RecordingDelegate> recordingDelegate_ =
+        std::make_shared<RecordingDelegate>(queues_, steps_, handled_);
     Client client_{std::make_shared<testing::FakeIpcConnection>(7), queues_};
 };
 

@@ -27,21 +27,22 @@ std::uint16_t serviceTypeOf(const std::shared_ptr<VelaReportingSession>& session
 
 } // namespace
 
-std::shared_ptr<VelaReportingClientServerInstance>
-VelaReportingClientServerInstance::initWithPID(std::int32_t pid, std::weak_ptr<Delegate> delegate,
-                                               std::shared_ptr<const VelaReportingServiceContext> context,
-                                               std::optional<platform::Identity> identity) {
+std::shared_ptr<VelaReportingClientServerInstance> VelaReportingClientServerInstance::initWithPID(
+    std::int32_t pid, std::weak_ptr<Delegate> delegate, std::shared_ptr<const VelaReportingServiceContext> context,
+    std::optional<platform::Identity> identity, std::weak_ptr<platform::IpcConnection> peer) {
     return std::make_shared<VelaReportingClientServerInstance>(Private(), pid, std::move(delegate), std::move(context),
-                                                               std::move(identity));
+                                                               std::move(identity), std::move(peer));
 }
 
 VelaReportingClientServerInstance::VelaReportingClientServerInstance(
     Private, std::int32_t pid, std::weak_ptr<Delegate> delegate,
-    std::shared_ptr<const VelaReportingServiceContext> context, std::optional<platform::Identity> identity)
+    std::shared_ptr<const VelaReportingServiceContext> context, std::optional<platform::Identity> identity,
+    std::weak_ptr<platform::IpcConnection> peer)
     : processIdentifier_(pid),
       delegate_(std::move(delegate)),
       context_(std::move(context)),
-      identity_(std::move(identity)) {
+      identity_(std::move(identity)),
+      peer_(std::move(peer)) {
     serviceLog().standard("new client with pid %lu", pid);
 }
 

@@ -34,14 +34,15 @@ public:
     using Delegate = VelaReportingServiceDelegateProtocol;
     using Sessions = Delegate::Sessions;
 
-    /// `pid`: the client's process. `identity`: on whose behalf it calls; none where that is not known.
-    static std::shared_ptr<VelaReportingClientServerInstance>
-    initWithPID(std::int32_t pid, std::weak_ptr<Delegate> delegate,
-                std::shared_ptr<const VelaReportingServiceContext> context,
-                std::optional<platform::Identity> identity = std::nullopt);
+    /// `pid`: the client's process. `identity`: on whose behalf it calls; none where that is not known. `peer`: who can
+    /// tell whether that process is still there; may be none.
+    static std::shared_ptr<VelaReportingClientServerInstance> initWithPID(
+        std::int32_t pid, std::weak_ptr<Delegate> delegate, std::shared_ptr<const VelaReportingServiceContext> context,
+        std::optional<platform::Identity> identity = std::nullopt, std::weak_ptr<platform::IpcConnection> peer = {});
     VelaReportingClientServerInstance(Private, std::int32_t pid, std::weak_ptr<Delegate> delegate,
                                       std::shared_ptr<const VelaReportingServiceContext> context,
-                                      std::optional<platform::Identity> identity);
+                                      std::optional<platform::Identity> identity,
+                                      std::weak_ptr<platform::IpcConnection> peer);
     ~VelaReportingClientServerInstance() override;
     VelaReportingClientServerInstance(const VelaReportingClientServerInstance&) = delete;
     VelaReportingClientServerInstance& operator=(const VelaReportingClientServerInstance&) = delete;
@@ -111,6 +112,7 @@ private:
         });
     }
 
+    std::optional<std::string> senderName() const;
     void startSession(Delegate& delegate, std::int64_t reporterID, platform::IpcReply<bool> reply);
     void stopSession(Delegate& delegate, std::int64_t reporterID);
     void endConnection(Delegate& delegate);
@@ -133,6 +135,7 @@ private:
     const std::weak_ptr<Delegate> delegate_;
     const std::shared_ptr<const VelaReportingServiceContext> context_;
     const std::optional<platform::Identity> identity_;
+    const std::weak_ptr<platform::IpcConnection> peer_;
 
     // Changed on the reporting queue, read on any thread. Held for a few instructions only, and inside the delegate's
     // lock where both are taken.

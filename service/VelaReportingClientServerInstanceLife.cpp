@@ -66,7 +66,11 @@ void VelaReportingClientServerInstance::startSession(Delegate& delegate, std::in
     delegate.setActiveSessionCount(delegate.activeSessionCount() + 1);
     session->setBeaconReportingEnabled(delegate.activeSessionCount() < kTooManyRealTimeSessions);
     session->start();
-    session->setDriverSnapShot(delegate.getSnapShot());
+    {
+        // Drivers are sampled.
+        const platform::BlockingScope blocking(context_->platform.workQueues);
+        session->setDriverSnapShot(delegate.getSnapShot());
+    }
     session->completeTransaction();
     const auto shared = std::make_shared<VelaReportingSharedReply>(std::move(reply));
     session->setTransactionCompleteBlock(

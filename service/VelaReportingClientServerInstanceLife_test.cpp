@@ -57,7 +57,7 @@ TEST_F(VelaReportingClientServerInstanceStepsTest, AStopTakesItsStepsInOrder) {
         }
     });
     client_.stop(42);
-    EXPECT_THAT(steps(), ElementsAre("driver logs 42", "session stops", "count 0", "active"));
+    EXPECT_THAT(steps(), ElementsAre("driver logs 42, blocking", "session stops", "count 0", "active"));
     EXPECT_EQ(hadSnapShot, false);
 }
 
@@ -112,7 +112,7 @@ TEST_F(VelaReportingClientServerInstanceStepsTest, DestroyStopsAStartedSessionAn
     const auto session = client_.session(42);
     steps();
     EXPECT_EQ(client_.destroy(42), true);
-    EXPECT_THAT(steps(), ElementsAre("session stops"));
+    EXPECT_THAT(steps(), ElementsAre("session stops, blocking"));
     EXPECT_EQ(recordingDelegate_->count, 1U);
     EXPECT_TRUE(session->driverSnapShot().has_value());
     EXPECT_EQ(pending->calls, 0); // the session still holds it
@@ -133,7 +133,7 @@ TEST_F(VelaReportingClientServerInstanceStepsTest, TheEndStopsStartedSessionsAnd
     EXPECT_THAT(log_.lines(), IsEmpty());
     EXPECT_THAT(steps(), IsEmpty());
     queues_.runUntilIdle();
-    EXPECT_THAT(steps(), ElementsAre("session stops", "session stops", "remove 7"));
+    EXPECT_THAT(steps(), ElementsAre("session stops, blocking", "session stops, blocking", "remove 7"));
     EXPECT_THAT(client_.instance()->clientReportingSessions(), IsEmpty());
     EXPECT_EQ(recordingDelegate_->count, 2U);
     EXPECT_EQ(linesSaying("ending session 2"), 0U);

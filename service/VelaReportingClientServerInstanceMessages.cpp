@@ -23,7 +23,7 @@ void VelaReportingClientServerInstance::sendMessage(Dictionary message, std::uin
     // Asked now, while the client is likely to live, and only where issue capture reads it.
     std::optional<std::string> processName;
     if (andType == AudioEventTypeJoule && VelaReportingUtilityIsInternalBuild()) {
-        processName = VelaReportingUtilityProcessNameForPID(context_->platform.processInformation, processIdentifier_);
+        processName = senderName();
     }
     enqueue([this, message = std::move(message), withCategory, andType, reporterIDs = std::move(forReportingIDs),
              processName = std::move(processName), reply = std::move(reply)](Delegate& delegate) mutable {
@@ -41,6 +41,13 @@ void VelaReportingClientServerInstance::sendMessage(Dictionary message, std::uin
         reply(delivery.passedLimit.empty() ? std::nullopt
                                            : std::optional(platform::IpcError{{}, 0, delivery.passedLimit}));
     });
+}
+
+/// None when the client's process is gone: its number may be another one's by now.
+std::optional<std::string> VelaReportingClientServerInstance::senderName() const {
+    auto name = VelaReportingUtilityProcessNameForPID(context_->platform.processInformation, processIdentifier_);
+    const std::shared_ptr<platform::IpcConnection> peer = peer_.lock();
+    return peer == nullptr || peer->confirmProcess() ? std::move(name) : std::nullopt;
 }
 
 void VelaReportingClientServerInstance::sendToReporters(Delegate& delegate, Delivery& delivery,

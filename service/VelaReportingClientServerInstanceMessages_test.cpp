@@ -88,6 +88,23 @@ TEST_F(VelaReportingClientServerInstanceMessageStepsTest, TheReplyComesAfterEver
     EXPECT_EQ(steps().back(), "reply");
 }
 
+TEST_F(VelaReportingClientServerInstanceMessageStepsTest, TheBridgesAndIssueCaptureGetTheMessageAsItIs) {
+    const Dictionary message{{"a b", 1}, {"epochTime", 2.5}};
+    client_.create(42);
+    recordingDelegate_->active = {client_.session(42)};
+    client_.send(message, 0x10000004, 8, to({42}));
+    client_.send(message, 0xFFFFFFFF, 65535, std::nullopt);
+    const Handled byID{message, 0x10000004, 8};
+    const Handled toAll{message, 0xFFFFFFFF, 65535};
+    EXPECT_THAT(handled_, ElementsAre(byID, byID, byID, byID, toAll, toAll, toAll, toAll));
+}
+
+TEST_F(VelaReportingClientServerInstanceMessageStepsTest, AMessageOfNoSessionReachesTheBridgesAsItIs) {
+    client_.send({{"a b", 1}}, 0x10000004, 8, std::nullopt);
+    const Handled alone{{{"a b", 1}}, 0x10000004, 8};
+    EXPECT_THAT(handled_, ElementsAre(alone, alone, alone, alone));
+}
+
 // The sender's process.
 
 TEST_F(VelaReportingClientServerInstanceMessageStepsTest, IssueCaptureGetsTheNameOfAProcessThatIsGoneSince) {
@@ -98,6 +115,15 @@ TEST_F(VelaReportingClientServerInstanceMessageStepsTest, IssueCaptureGetsTheNam
     fakes_.processes.remove(7);
     queues_.runUntilIdle();
     EXPECT_THAT(steps(), ElementsAre("tally 42", "joule 42", "telem 42", "snag 42 of player", "session sends"));
+}
+
+TEST_F(VelaReportingClientServerInstanceMessageStepsTest, AProcessThatWasGoneHasNoNameAsItsNumberMayBeAnothers) {
+    makeInternalBuild();
+    client_.create(42);
+    steps();
+    client_.connection->loseProcess();
+    client_.send({{"a", 1}}, 1, 8, to({42}));
+    EXPECT_THAT(steps(), ElementsAre("tally 42", "joule 42", "telem 42", "snag 42 of nobody", "session sends"));
 }
 
 TEST_F(VelaReportingClientServerInstanceMessagesTest, TheNameIsAskedForOnlyWhereIssueCaptureUsesIt) {
@@ -258,8 +284,9 @@ TEST_F(VelaReportingClientServerInstanceMessageStepsTest, TheStandaloneSessionIs
     auto looking = std::make_unique<Looking>();
     const Looking& seen = *looking;
     const auto context = std::make_shared<const VelaReportingServiceContext>(
-        VelaReportingServicePlatform{platform_}, std::move(looking), std::make_unique<RecordingBridge>("joule", steps_),
-        std::make_unique<RecordingBridge>("telem", steps_));
+        VelaReportingServicePlatform{platform_}, std::move(looking),
+        std::make_unique<RecordingBridge>("joule", steps_, handled_),
+        std::make_unique<RecordingBridge>("telem", steps_, handled_));
     client_.connection->setExportedObject(
         VelaReportingClientServerInstance::initWithPID(7, recordingDelegate_, context));
     client_.send({{"a", 1}}, 1, 1, std::nullopt);

@@ -90,7 +90,8 @@ TEST_F(VelaReportingClientServerInstanceStartStepsTest, AStartTakesItsStepsInOrd
         }
     });
     client_.start(42);
-    EXPECT_THAT(steps(), ElementsAre("count 1", "session starts", "snapshot", "features", "session sends", "active"));
+    EXPECT_THAT(steps(),
+                ElementsAre("count 1", "session starts", "snapshot, blocking", "features", "session sends", "active"));
     EXPECT_EQ(hadSnapShot, false);
     EXPECT_TRUE(client_.session(42)->driverSnapShot().has_value());
 }
@@ -101,8 +102,8 @@ TEST_F(VelaReportingClientServerInstanceStartStepsTest, WithTheLogOffNobodyGathe
     steps();
     client_.start(42);
     client_.stop(42);
-    EXPECT_THAT(steps(), ElementsAre("count 1", "session starts", "snapshot", "features", "driver logs 42",
-                                     "session stops", "count 0"));
+    EXPECT_THAT(steps(), ElementsAre("count 1", "session starts", "snapshot, blocking", "features",
+                                     "driver logs 42, blocking", "session stops, blocking", "count 0"));
 }
 
 // The reply of a start.

@@ -235,7 +235,28 @@ TEST_F(VelaReportingClientServerInstanceTest, ItsOwnSessionComesFirstAndSilently
     EXPECT_EQ(log_.lines().size(), 4U);
 }
 
-TEST_F(VelaReportingClientServerInstanceTest, ValidationAnswersBetweenTwoLinesOfOneText) {
+TEST_F(VelaReportingClientServerInstanceTest, TheAnswerComesBehindTheLineButForTheServiceType) {
+    const Client client = connect(7);
+    std::string lineAtReply;
+    const auto noting = [&](const std::optional<platform::IpcError>&, const auto&) {
+        lineAtReply = log_.lines().back().message;
+    };
+    const auto lineAtReplyOf = [&](const auto& call) {
+        lineAtReply = "no reply";
+        call();
+        queues_.runUntilIdle();
+        return lineAtReply;
+    };
+    platform::ReportingServiceProtocol& operations = client.operations();
+    EXPECT_EQ(lineAtReplyOf([&] { operations.createReportingSession(42, noting); }), "session created for reporter 42");
+    EXPECT_EQ(lineAtReplyOf([&] { operations.setServiceType(3, 42, noting); }), "service type 3 set for reporter  42");
+    EXPECT_EQ(lineAtReplyOf([&] { operations.getServiceNameForReporterID(42, noting); }), "fetching seviceType");
+    EXPECT_EQ(lineAtReplyOf([&] { operations.reporterID(42, noting); }), "validating reporter 42");
+    EXPECT_EQ(lineAtReplyOf([&] { operations.stopReportingSessionForID(42, noting); }), "stopping 42");
+    EXPECT_EQ(lineAtReplyOf([&] { operations.destroyReportingSession(42, noting); }), "destroying 42");
+}
+
+TEST_F(VelaReportingClientServerInstanceTest, ValidationAnswersBehindTwoLinesOfOneText) {
     const Client client = connect(7);
     client.create(42);
     log_.clear();

@@ -84,8 +84,8 @@ bool VelaReportingServiceDelegate::shouldAcceptNewConnection(
     std::shared_ptr<VelaReportingClientServerInstance> client;
     {
         const RecursiveMutexLock lock(lock_);
-        client =
-            VelaReportingClientServerInstance::initWithPID(pid, weak_from_this(), context_, connection->peerIdentity());
+        client = VelaReportingClientServerInstance::initWithPID(pid, weak_from_this(), context_,
+                                                                connection->peerIdentity(), connection);
         connection->setExportedObject(client);
     }
     // Before the connection is resumed, so that it runs ahead of every call.

@@ -21,6 +21,7 @@ TEST_F(VelaReportingServiceDelegateTest, BeginsWithReportingOnAndNobody) {
 
 TEST_F(VelaReportingServiceDelegateTest, HasOneReportingQueue) {
     EXPECT_EQ(service().reportingQueue().name(), "com.orvex.vela.reporting.server");
+    EXPECT_EQ(queues_.qualityOf("com.orvex.vela.reporting.server"), platform::QualityOfService::UserInteractive);
     EXPECT_EQ(queues_.liveQueues(), 1U);
 }
 

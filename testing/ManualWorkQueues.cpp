@@ -93,7 +93,13 @@ std::size_t ManualWorkQueues::liveQueues() const {
         std::count_if(queues_.begin(), queues_.end(), [](const auto& queue) { return queue->serial; }));
 }
 
-std::unique_ptr<SerialQueue> ManualWorkQueues::makeSerialQueue(std::string_view name, QualityOfService) {
+std::optional<QualityOfService> ManualWorkQueues::qualityOf(std::string_view name) const {
+    const auto found = qualities_.find(name);
+    return found == qualities_.end() ? std::nullopt : std::optional(found->second);
+}
+
+std::unique_ptr<SerialQueue> ManualWorkQueues::makeSerialQueue(std::string_view name, QualityOfService quality) {
+    qualities_.insert_or_assign(std::string(name), quality);
     return std::make_unique<ManualSerialQueue>(*this, name);
 }
 

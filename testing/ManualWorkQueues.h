@@ -9,9 +9,12 @@
 #include <cstddef>
 #include <cstdint>
 #include <deque>
+#include <functional>
 #include <map>
 #include <memory>
 #include <optional>
+#include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -67,6 +70,8 @@ public:
     std::size_t suspendedQueues() const;
     /// Serial queues that exist.
     std::size_t liveQueues() const;
+    /// With which quality the serial queue of this name was made last; none when there was none.
+    std::optional<platform::QualityOfService> qualityOf(std::string_view name) const;
     /// Calls of `beginBlocking` without their `endBlocking`.
     unsigned blockingDepth() const { return blockingDepth_; }
 
@@ -113,6 +118,7 @@ private:
     std::unique_ptr<platform::WorkQueue> background_;
     std::uint64_t nextOrder_ = 0;
     unsigned blockingDepth_ = 0;
+    std::map<std::string, platform::QualityOfService, std::less<>> qualities_; // of serial queues, by name
 };
 
 } // namespace vela::testing

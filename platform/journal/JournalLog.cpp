@@ -66,6 +66,7 @@ std::string fieldsOf(const LogRecord& record, std::string_view identifier) {
     appendField(fields, "SYSLOG_IDENTIFIER", identifier);
     appendField(fields, "SUBSYSTEM", record.subsystem);
     appendField(fields, "CATEGORY", record.category);
+    appendField(fields, "SOURCE_NAME", record.sourceName);
     appendField(fields, "CODE_FILE", record.sourceFile);
     appendField(fields, "CODE_LINE", record.line);
     if (record.reporter) {

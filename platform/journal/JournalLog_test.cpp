@@ -142,6 +142,7 @@ TEST_F(JournalLogTest, ALineIsOneDatagramOfFields) {
                 ElementsAre(Pair("MESSAGE", "     VelaReportingSession:42    starting session owned by -7"),
                             Pair("PRIORITY", "6"), Pair("SYSLOG_IDENTIFIER", "vela-test"),
                             Pair("SUBSYSTEM", "com.orvex.vela"), Pair("CATEGORY", "velarr"),
+                            Pair("SOURCE_NAME", "VelaReportingSession"),
                             Pair("CODE_FILE", "session/VelaReportingSession.cpp"), Pair("CODE_LINE", "42"),
                             Pair("VELA_REPORTER_ID", "-7")));
     EXPECT_FALSE(journal_->receive());
@@ -153,7 +154,7 @@ TEST_F(JournalLogTest, TheBytesOfALineAreThoseOfTheProtocol) {
     log->write(recordOf(LogLevel::Error, "text"));
     EXPECT_EQ(journal_->receive()->bytes,
               "MESSAGE=text\nPRIORITY=3\nSYSLOG_IDENTIFIER=vela-test\nSUBSYSTEM=com.orvex.vela\nCATEGORY=velarr\n"
-              "CODE_FILE=session/VelaReportingSession.cpp\nCODE_LINE=42\n");
+              "SOURCE_NAME=VelaReportingSession\nCODE_FILE=session/VelaReportingSession.cpp\nCODE_LINE=42\n");
 }
 
 TEST_F(JournalLogTest, AValueOfTwoLinesCarriesItsLength) {
@@ -163,14 +164,14 @@ TEST_F(JournalLogTest, AValueOfTwoLinesCarriesItsLength) {
     ASSERT_TRUE(datagram);
     EXPECT_TRUE(datagram->bytes.starts_with(std::string("MESSAGE\n\x0c\0\0\0\0\0\0\0first\nsecond\nPRIORITY=", 38)));
     EXPECT_EQ(Journal::parse(datagram->bytes)[0].second, "first\nsecond");
-    EXPECT_EQ(Journal::parse(datagram->bytes).size(), 7U);
+    EXPECT_EQ(Journal::parse(datagram->bytes).size(), 8U);
 }
 
 TEST_F(JournalLogTest, AValueCannotBecomeAField) {
     const auto log = open();
     log->write(recordOf(LogLevel::Info, "text\nPRIORITY=0\n"));
     const Fields fields = journal_->receiveFields();
-    ASSERT_EQ(fields.size(), 7U);
+    ASSERT_EQ(fields.size(), 8U);
     EXPECT_THAT(fields[0], Pair("MESSAGE", "text\nPRIORITY=0\n"));
     EXPECT_THAT(fields[1], Pair("PRIORITY", "6"));
 }
@@ -198,7 +199,7 @@ TEST_F(JournalLogTest, WhatIsTooLargeForADatagramGoesByASealedFile) {
     EXPECT_EQ(pread(datagram->file, content.data(), content.size(), 0), static_cast<ssize_t>(content.size()));
     close(datagram->file);
     const Fields fields = Journal::parse(content);
-    ASSERT_EQ(fields.size(), 7U);
+    ASSERT_EQ(fields.size(), 8U);
     EXPECT_EQ(fields[0].first, "MESSAGE");
     EXPECT_TRUE(fields[0].second == text);
     EXPECT_THAT(fields[6], Pair("CODE_LINE", "42"));

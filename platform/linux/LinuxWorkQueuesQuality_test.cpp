@@ -256,6 +256,7 @@ TEST(LinuxWorkQueuesQualityTest, WhatIsPostedWhileWakesAreDeferredRunsAfterwards
     std::atomic<int> ran = 0;
     LinuxWorkQueues queues(4);
     std::vector<std::unique_ptr<SerialQueue>> all;
+    all.reserve(20);
     for (int i = 0; i < 20; ++i) {
         all.push_back(queues.makeSerialQueue("queue", QualityOfService::Default));
     }
