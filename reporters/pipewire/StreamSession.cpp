@@ -90,6 +90,9 @@ void StreamSession::goDown(const Moment& now) {
     if (phase_ == Phase::Running) {
         phase_ = Phase::Gap;
         gapStart_ = now;
+        if (moved_ && now.monotonic - *moved_ > kMoveDelay) {
+            moved_.reset();
+        }
     }
 }
 
@@ -113,6 +116,7 @@ void StreamSession::startRun() {
     ++runs_;
     told_ = {};
     gap_.reset();
+    moved_.reset();
     unsettled_.reset();
     if (runs_ == 1) {
         statistics_.transition(Transition::Start, milliseconds(runStart_.monotonic - created_.monotonic));
@@ -261,7 +265,7 @@ void StreamSession::tellDevices(const Moment& at) {
     if (now_.devices.empty()) {
         return; // on its way from one device to another
     }
-    noteGap();
+    noteTransition(at);
     const std::string names = namesOf(now_.devices);
     if (names != namesOf(told_.devices)) {
         report(at, AudioEventCategoryRouteChange, AudioEventTypeState,
@@ -287,19 +291,27 @@ void StreamSession::tellDevices(const Moment& at) {
     told_.devices = now_.devices;
 }
 
-/// What the last silence was about shows in how the devices differ across it.
-void StreamSession::noteGap() {
+/// What the last silence was about shows in how the devices differ across it. A move may also have been told before:
+/// where the stream's process is slow to answer, its silence begins later.
+void StreamSession::noteTransition(const Moment& at) {
     const std::optional<nanoseconds> gap = std::exchange(gap_, std::nullopt);
-    if (!gap || told_.devices.empty()) {
+    if (told_.devices.empty()) {
         return;
     }
     if (namesOf(now_.devices) != namesOf(told_.devices)) {
+        moved_ = at.monotonic;
+    }
+    if (!gap) {
+        return;
+    }
+    if (std::exchange(moved_, std::nullopt)) {
         statistics_.transition(Transition::Move, milliseconds(*gap));
         return;
     }
     const bool otherFormat = std::ranges::any_of(now_.devices, [&](const DeviceFacts& device) {
         const DeviceFacts* const before = findDevice(told_.devices, device.name);
-        return before != nullptr && before->format != device.format;
+        // A format that was not known is no other one.
+        return before != nullptr && before->format && device.format && before->format != device.format;
     });
     if (otherFormat) {
         statistics_.transition(Transition::RateChange, milliseconds(*gap));

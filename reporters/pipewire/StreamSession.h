@@ -28,6 +28,8 @@ inline constexpr std::chrono::milliseconds kStartDelay{50};
 inline constexpr std::chrono::milliseconds kStopDelay{50};
 /// Changes of devices that come together are one.
 inline constexpr std::chrono::milliseconds kSettleDelay{20};
+/// A silence that begins so long after a move at the most is the move's: the stream's own process has to answer first.
+inline constexpr std::chrono::milliseconds kMoveDelay{5000};
 /// Statistics of cycles come that late at the most.
 inline constexpr std::chrono::milliseconds kStatisticsDelay{1200};
 /// A stream that is linked and neither runs nor pauses for longer has an error.
@@ -104,7 +106,7 @@ private:
     void tellFormat(const Moment& at);
     void tellDevices(const Moment& at);
     void tellEverything(const Moment& at);
-    void noteGap();
+    void noteTransition(const Moment& at);
     void watchStall(const Moment& now);
     void tellError(const Moment& at, const std::string& what);
     void noteIncomplete(std::chrono::nanoseconds signal);
@@ -127,8 +129,9 @@ private:
     Moment runStart_; ///< both clocks are read there; the times of the run are told from it
     Moment runEnd_;
     Moment gapStart_;
-    std::optional<std::chrono::nanoseconds> gap_; ///< length of the last one, until its cause is known
-    std::optional<Moment> unsettled_;             ///< since when devices differ from what was told
+    std::optional<std::chrono::nanoseconds> gap_;   ///< length of the last one, until its cause is known
+    std::optional<std::chrono::nanoseconds> moved_; ///< when the stream got other devices, until its silence is known
+    std::optional<Moment> unsettled_;               ///< since when devices differ from what was told
     std::optional<std::chrono::nanoseconds> stalled_;
     bool isStallTold_ = false;
     CycleTotals totals_;

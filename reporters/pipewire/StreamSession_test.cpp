@@ -47,6 +47,11 @@ protected:
             session.onTime(at(static_cast<double>(deadline->count()) / 1e6));
         }
     }
+    static void silence(StreamSession& session, double from, double to) {
+        session.setState(NodeState::Idle, "", at(from));
+        session.setState(NodeState::Running, "", at(to));
+        passTime(session, to + 100);
+    }
 
     RecordedReports reports;
     RecordedStatistics statistics;
@@ -243,6 +248,53 @@ TEST_F(StreamSessionTest, AMoveIsOneRouteChange) {
     EXPECT_THAT(statistics.take(), ElementsAre("move 3"));
 }
 
+TEST_F(StreamSessionTest, ASilenceAfterAMoveThatWasToldIsOfTheMove) {
+    StreamSession session = running();
+    session.setDevices({}, at(300));
+    session.setDevices(devices("headphones"), at(301));
+    passTime(session, 434);
+    EXPECT_THAT(reports.takeWith("RouteChange"),
+                ElementsAre("send 7 RouteChange/State @1000.300 active_devices=\"headphones\" device_count=1"));
+    silence(session, 434, 445);
+    EXPECT_THAT(statistics.take(), ElementsAre("move 11"));
+}
+
+TEST_F(StreamSessionTest, ASilenceFiveSecondsAfterAMoveIsOfTheMove) {
+    StreamSession session = running();
+    session.setDevices(devices("headphones"), at(300));
+    passTime(session, 5300);
+    silence(session, 5300, 5304);
+    EXPECT_THAT(statistics.take(), ElementsAre("move 4"));
+}
+
+TEST_F(StreamSessionTest, ASilenceLaterThanThatIsNotOfTheMove) {
+    StreamSession session = running();
+    session.setDevices(devices("headphones"), at(300));
+    passTime(session, 5301);
+    silence(session, 5301, 5304);
+    EXPECT_THAT(statistics.take(), IsEmpty());
+}
+
+TEST_F(StreamSessionTest, AMoveHasOneSilence) {
+    StreamSession session = running();
+    session.setDevices(devices("headphones"), at(300));
+    passTime(session, 400);
+    silence(session, 400, 404);
+    silence(session, 600, 607);
+    EXPECT_THAT(statistics.take(), ElementsAre("move 4"));
+}
+
+TEST_F(StreamSessionTest, AMoveOfTheRunBeforeHasNoSilenceInThisOne) {
+    StreamSession session = running();
+    session.setDevices(devices("headphones"), at(300));
+    passTime(session, 400);
+    session.setState(NodeState::Idle, "", at(400));
+    passTime(session, 600);
+    session.setState(NodeState::Running, "", at(600));
+    silence(session, 700, 704);
+    EXPECT_THAT(statistics.take(), IsEmpty());
+}
+
 TEST_F(StreamSessionTest, AMoveWithoutSilenceIsDatedToItsBegin) {
     StreamSession session = running();
     session.setDevices({}, at(300));
@@ -284,6 +336,19 @@ TEST_F(StreamSessionTest, AnotherRateOfTheDeviceIsAnOutputState) {
     EXPECT_THAT(reports.take(), ElementsAre("send 7 Output/State @1000.309 device=\"speaker\" device_state=\"running\" "
                                             "device_format=\"F32P 44100 Hz 2 ch\" device_volume=1 device_muted=false"));
     EXPECT_THAT(statistics.take(), ElementsAre("rate 9"));
+}
+
+TEST_F(StreamSessionTest, AFormatThatBecomesKnownInASilenceIsNoOtherRate) {
+    StreamSession session = running();
+    std::vector<DeviceFacts> unknown = devices("speaker");
+    unknown.front().format.reset();
+    session.setDevices(unknown, at(300));
+    passTime(session, 400);
+    session.setState(NodeState::Idle, "", at(400));
+    session.setDevices(devices("speaker"), at(402));
+    session.setState(NodeState::Running, "", at(404));
+    passTime(session, 1000);
+    EXPECT_THAT(statistics.take(), IsEmpty());
 }
 
 TEST_F(StreamSessionTest, ChangesInASilenceThatEndsTheRunAreOfTheNextOne) {
