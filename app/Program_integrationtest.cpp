@@ -117,5 +117,18 @@ TEST_F(ReportingdTest, VersionAndHelpArePrinted) {
     EXPECT_EQ(run({"--help"}).status, 0);
 }
 
+TEST_F(ReportingdTest, OutputThatCannotBeWrittenIsAFailure) {
+    const testing::ProgramRun full = testing::runProgram(
+        {"/bin/sh", "-c", R"("$0" --check --set "paths.state=$1/state" --set "paths.runtime=$1/r" >/dev/full)",
+         VELA_REPORTINGD, folder_.path()},
+        {});
+    EXPECT_EQ(full.status, 1);
+    EXPECT_EQ(full.error, "vela-reportingd: standard output cannot be written: No space left on device\n");
+    const testing::ProgramRun closed =
+        testing::runProgram({"/bin/sh", "-c", R"("$0" --version >&-)", VELA_REPORTINGD}, {});
+    EXPECT_EQ(closed.status, 1);
+    EXPECT_EQ(closed.error, "vela-reportingd: standard output cannot be written: Bad file descriptor\n");
+}
+
 } // namespace
 } // namespace vela

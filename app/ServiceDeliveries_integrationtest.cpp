@@ -268,6 +268,55 @@ TEST_F(ServiceDeliveriesTest, DeliveriesAreFollowed) {
     EXPECT_TRUE(follower.runs());
 }
 
+TEST_F(ServiceDeliveriesTest, TheHeadingStandsOnceOverAllPages) {
+    constexpr int kMessages = 300; // more than a page
+    ServiceClient client = service_.client();
+    startSession(client);
+    for (int number = 0; number < kMessages; ++number) {
+        client.send("sendMessage", R"([{"number":)" + std::to_string(number) + R"(},"Playback","Start",[42]])");
+    }
+    client.call("stopReportingSessionForID", "[42]");
+    ASSERT_TRUE(waitUntilDelivered("beacon"));
+    std::istringstream lines(
+        service_.velactl({"deliveries", "--backend", "beacon", "--set", "paths.state=" + service_.folder("state")})
+            .out);
+    int headings = 0;
+    int rows = 0;
+    std::size_t backendColumn = 0;
+    for (std::string line; std::getline(lines, line);) {
+        if (line.starts_with("SEQ ")) {
+            ++headings;
+            backendColumn = line.find("BACKEND");
+            continue;
+        }
+        ++rows;
+        EXPECT_EQ(line.find("  beacon  "), backendColumn - 2) << line;
+    }
+    EXPECT_EQ(headings, 1);
+    EXPECT_GE(rows, kMessages);
+}
+
+TEST_F(ServiceDeliveriesTest, AFollowerEndsWhenItsReaderHasGone) {
+    ServiceClient client = service_.client();
+    startSession(client);
+    client.call("stopReportingSessionForID", "[42]");
+    ASSERT_TRUE(waitUntilDelivered("beacon"));
+    // Nothing is delivered from here on.
+    testing::RunningProgram pipeline({"/bin/sh", "-c", R"(timeout 60 "$0" "$@" | head -n 1)", VELACTL, "deliveries",
+                                      "--follow", "--set", "paths.state=" + service_.folder("state")},
+                                     RunningService::environment());
+    EXPECT_TRUE(testing::waitUntil([&] { return !pipeline.runs(); }));
+    EXPECT_THAT(pipeline.out(), ::testing::StartsWith("SEQ  TIME "));
+    EXPECT_EQ(pipeline.error(), "");
+}
+
+TEST_F(ServiceDeliveriesTest, AFolderIsNoStore) {
+    const testing::ProgramRun run = service_.velactl({"deliveries", "--set", "store.path=/tmp"});
+    EXPECT_EQ(run.status, 1);
+    EXPECT_EQ(run.out, "");
+    EXPECT_EQ(run.error, "velactl: /tmp is a folder and no store\n");
+}
+
 } // namespace
 
 } // namespace vela

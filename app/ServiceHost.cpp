@@ -114,7 +114,6 @@ platform::Result<std::unique_ptr<platform::DbusServiceEndpoint>> ServiceHost::op
     }
     if (*handed) {
         options.listeningDescriptor = (*std::move(handed))->release();
-        hostLog().standard("serving at the socket of the service manager");
     } else {
         const platform::Result<platform::Done> made =
             platform_.fileSystem().createDirectories(settings_.paths.runtime, kFolderPermissions);
@@ -122,9 +121,13 @@ platform::Result<std::unique_ptr<platform::DbusServiceEndpoint>> ServiceHost::op
             return made.failure();
         }
         options.socketPath = settings_.paths.runtime + "/" + std::string(platform::dbus::kSocketName);
-        hostLog().standard("serving at %@", options.socketPath);
     }
-    return platform::DbusServiceEndpoint::open(std::move(options));
+    const std::string place = options.socketPath.empty() ? "the socket of the service manager" : options.socketPath;
+    auto endpoint = platform::DbusServiceEndpoint::open(std::move(options));
+    if (endpoint) {
+        hostLog().standard("serving at %@", place);
+    }
+    return endpoint;
 }
 
 platform::DbusServiceOptions ServiceHost::endpointOptions() {

@@ -57,6 +57,20 @@ TEST(ServiceLifeTest, SigintEndsItAsWell) {
     EXPECT_EQ(service.program().waitForEnd(), 0);
 }
 
+TEST(ServiceLifeTest, NothingTakesThePlaceOfAStandardDescriptorThatIsClosed) {
+    const testing::TemporaryFolder folder;
+    const std::string command = "exec '" VELA_REPORTINGD "' --set paths.root=" + (folder / "root") +
+                                " --set paths.state=" + (folder / "state") +
+                                " --set paths.runtime=" + (folder / "run") + " --set log.target=stderr <&- >&- 2>&-";
+    const testing::RunningProgram program({"/bin/sh", "-c", command}, {"PATH=/usr/bin:/bin"});
+    ASSERT_TRUE(testing::waitUntil(
+        [&] { return std::filesystem::exists(folder / ("run/" + std::string(platform::dbus::kSocketName))); }));
+    for (const char* const descriptor : {"0", "1", "2"}) {
+        EXPECT_EQ(std::filesystem::read_symlink("/proc/" + std::to_string(program.pid()) + "/fd/" + descriptor),
+                  "/dev/null");
+    }
+}
+
 TEST(ServiceLifeTest, TheServiceIsSetUpBeforeItTakesClients) {
     RunningService service;
     service.client().call("getAllReporters");

@@ -112,9 +112,7 @@ TEST_F(ServiceToolsTest, AFileWithAFaultSendsNothing) {
     const std::string path = file("{\"call\":\"createReportingSession\",\"args\":[42]}\n{\"call\":\"create\"}\n");
     const testing::ProgramRun run = service_.velactl({"run", path});
     EXPECT_EQ(run.status, 1);
-    EXPECT_EQ(run.error,
-              "velactl: " + path +
-                  ":2: a line is {\\\"call\\\":\\\"OPERATION\\\",\\\"args\\\":[...]} or {\\\"sleep\\\":SECONDS}\n");
+    EXPECT_EQ(run.error, "velactl: " + path + ":2: there is no operation \"create\"\n");
     EXPECT_EQ(service_.linesWith("newConnection"), 0U);
 }
 
@@ -142,6 +140,21 @@ TEST_F(ServiceToolsTest, VelactlShowsSessionsAndStatus) {
 
 TEST_F(ServiceToolsTest, VelactlKillsTheService) {
     EXPECT_EQ(service_.velactl({"call", "killService"}).status, 0);
+    EXPECT_EQ(service_.program().waitForEnd(), 2);
+}
+
+TEST_F(ServiceToolsTest, VelactlCallsWhatStandsBehindTheMarkOfTheLastOption) {
+    const testing::ProgramRun run = service_.velactl({"call", "--", "createReportingSession", "42"});
+    EXPECT_EQ(run.out, "true\n");
+    EXPECT_EQ(run.status, 0) << run.error;
+    EXPECT_EQ(service_.velactl({"call", "--json", "createReportingSession", "-17"}).out, "true\n");
+}
+
+TEST_F(ServiceToolsTest, VelactlRunShowsTheCallThatEndedTheService) {
+    const testing::ProgramRun run = service_.velactl({"run", file("{\"call\":\"killService\"}\n")});
+    EXPECT_EQ(run.out, "{\"line\":1,\"call\":\"killService\"}\n");
+    EXPECT_EQ(run.error, "");
+    EXPECT_EQ(run.status, 0);
     EXPECT_EQ(service_.program().waitForEnd(), 2);
 }
 

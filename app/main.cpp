@@ -5,9 +5,11 @@
 #include "app/ServicePlatform.h"
 #include "platform/dbus/ServiceEndpoint.h"
 #include "platform/host/HostFacts.h"
+#include "platform/host/StandardOutput.h"
 #include "platform/linux/DescriptorLimit.h"
 #include "platform/linux/LinuxFileSystem.h"
 #include "platform/linux/ServiceManager.h"
+#include "platform/linux/StandardDescriptors.h"
 #include "platform/toml/SettingsLoading.h"
 
 #include <chrono>
@@ -31,8 +33,9 @@ int refuseUsage(std::string_view reason) {
 }
 
 int print(std::string_view text, int status) {
-    std::cout << text << std::flush;
-    return std::cout ? status : EXIT_FAILURE;
+    platform::StandardOutput output;
+    output.stream() << text;
+    return output.finish("vela-reportingd", std::cerr) ? status : EXIT_FAILURE;
 }
 
 int check(const CommandLine& line, const platform::LoadedSettings& loaded) {
@@ -78,6 +81,7 @@ int runWithSettings(const CommandLine& line, platform::ServiceManager& manager) 
 } // namespace
 
 int main(int argumentCount, char** arguments) {
+    platform::holdStandardDescriptors();
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN)); // it cannot fail for a signal that exists
     platform::ServiceManager manager;
     const std::vector<std::string_view> given(arguments + (argumentCount > 0 ? 1 : 0), arguments + argumentCount);

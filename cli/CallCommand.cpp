@@ -4,11 +4,14 @@
 #include "cli/Operations.h"
 #include "cli/ServiceConnection.h"
 #include "cli/Subcommand.h"
+#include "common/CommandOptions.h"
 #include "common/SettingValues.h"
+#include "common/values/Dictionary.h"
 #include "common/values/Json.h"
 #include "platform/dbus/Protocol.h"
 #include "platform/linux/LinuxClock.h"
 
+#include <array>
 #include <cerrno>
 #include <ostream>
 #include <vector>
@@ -17,7 +20,27 @@ namespace vela {
 
 namespace {
 
-void listOperations(Console& console) {
+constexpr std::array<CommandOption, 1> kCallOptions{{{"--json"}}};
+
+void printJson(const Operation& operation, std::ostream& out) {
+    ArrayBuilder arguments;
+    for (const OperationArgument& argument : operation.arguments) {
+        arguments.add(argument.name);
+    }
+    out << jsonText(Value(Dictionary{{"operation", operation.name},
+                                     {"arguments", arguments.build()},
+                                     {"signature", operation.signature},
+                                     {"reply_signature", operation.replySignature}}))
+        << '\n';
+}
+
+void listOperations(bool json, Console& console) {
+    if (json) {
+        for (const Operation& operation : operations()) {
+            printJson(operation, console.out);
+        }
+        return;
+    }
     console.out << "Operations; arguments are JSON, SERVICE-TYPE, CATEGORY and TYPE may be names:\n\n";
     for (const Operation& operation : operations()) {
         console.out << "  " << usageOf(operation) << '\n';
@@ -75,16 +98,21 @@ int call(const Operation& operation, std::span<const Value> arguments, platform:
 } // namespace
 
 int runCall(std::span<const std::string_view> arguments, Console& console) {
-    if (arguments.empty()) {
-        listOperations(console);
+    const platform::Result<CommandArguments> given = readArguments(arguments, kCallOptions);
+    if (!given) {
+        return refuseUsage("call", given.failure().description, console);
+    }
+    const std::span<const std::string> words(given->operands);
+    if (words.empty()) {
+        listOperations(given->has("--json"), console);
         return kDone;
     }
-    const Operation* operation = findOperation(arguments.front());
+    const Operation* operation = findOperation(words.front());
     if (operation == nullptr) {
-        return refuseUsage("call", "there is no operation " + quotedText(arguments.front()), console);
+        return refuseUsage("call", "there is no operation " + quotedText(words.front()), console);
     }
     std::vector<Value> values;
-    for (const std::string_view text : arguments.subspan(1)) {
+    for (const std::string& text : words.subspan(1)) {
         const OperationArgument* argument =
             values.size() < operation->arguments.size() ? &operation->arguments[values.size()] : nullptr;
         platform::Result<Value> value = readArgument(argument, text);

@@ -12,9 +12,12 @@
 #include "platform/sqlite/StoreReader.h"
 
 #include <array>
+#include <cerrno>
 #include <charconv>
+#include <filesystem>
 #include <optional>
 #include <ostream>
+#include <system_error>
 
 namespace vela {
 
@@ -34,8 +37,8 @@ constexpr std::array<CommandOption, 7> kOptions{{{"--backend", true},
 
 /// A payload in the table; --json prints it whole.
 constexpr std::size_t kShownPayload = 80;
-/// How long a change may go unseen while nothing is committed: the end of the wait only looks again.
-constexpr std::chrono::milliseconds kFollowWait{1000};
+/// How long the output's reader may be gone unseen while nothing is committed.
+constexpr std::chrono::milliseconds kFollowWait{200};
 
 std::string numberCell(const std::optional<std::int64_t>& number) { return number ? std::to_string(*number) : "-"; }
 
@@ -60,18 +63,16 @@ std::string kindCell(const StoredDelivery& delivery) {
            std::string(VelaReportingUtilityTypeString(static_cast<std::uint32_t>(*delivery.type)));
 }
 
-void printTable(const std::vector<StoredDelivery>& deliveries, Console& console) {
-    const platform::LinuxClock clock;
-    TextTable table({"SEQ", "TIME", "BACKEND", "OPERATION", "SESSION", "KIND", "NAME", "PAYLOAD"});
-    for (const StoredDelivery& delivery : deliveries) {
-        const bool mark =
-            delivery.backend == "beacon" && delivery.operation != "send" && delivery.operation != "send_one";
-        table.add({std::to_string(delivery.seq), localTimeText(delivery.time, clock), delivery.backend,
-                   delivery.operation, numberCell(delivery.session), kindCell(delivery),
-                   delivery.name ? escapedText(*delivery.name) : "-", payloadCell(delivery.payload)},
-                  mark);
-    }
-    table.print(console.out, console.colour);
+TextTable makeTable() {
+    return TextTable({"SEQ", "TIME", "BACKEND", "OPERATION", "SESSION", "KIND", "NAME", "PAYLOAD"});
+}
+
+void addRow(const StoredDelivery& delivery, TextTable& table) {
+    const bool mark = delivery.backend == "beacon" && delivery.operation != "send" && delivery.operation != "send_one";
+    table.add({std::to_string(delivery.seq), localTimeText(delivery.time, platform::LinuxClock()), delivery.backend,
+               delivery.operation, numberCell(delivery.session), kindCell(delivery),
+               delivery.name ? escapedText(*delivery.name) : "-", payloadCell(delivery.payload)},
+              mark);
 }
 
 void printJson(const StoredDelivery& delivery, std::ostream& out) {
@@ -131,40 +132,77 @@ int fail(const platform::Failure& failure, Console& console) {
     return kFailed;
 }
 
+/// The deliveries on the console, page by page.
+class DeliveryPrinter {
+public:
+    DeliveryPrinter(bool json, Console& console) : json_(json), console_(console) {}
+
+    /// False when the output cannot be written.
+    bool print(const std::vector<StoredDelivery>& page) {
+        for (const StoredDelivery& delivery : page) {
+            if (json_) {
+                printJson(delivery, console_.out);
+            } else {
+                addRow(delivery, table_);
+            }
+        }
+        if (!json_) {
+            table_.printPage(console_.out, console_.colour);
+        }
+        hasPrinted_ = true;
+        console_.out.flush();
+        return static_cast<bool>(console_.out);
+    }
+    void finish() {
+        if (!hasPrinted_ && !json_) {
+            console_.out << "No deliveries\n";
+        }
+    }
+
+private:
+    const bool json_;
+    Console& console_;
+    TextTable table_ = makeTable();
+    bool hasPrinted_ = false;
+};
+
+/// Waits until something is committed. False when nobody reads the output any more.
+platform::Result<bool> waitForMore(StoreReader& reader, const Console& console) {
+    while (!console.isReaderGone || !console.isReaderGone()) {
+        platform::Result<bool> changed = reader.waitForChange(kFollowWait);
+        if (!changed || *changed) {
+            return changed;
+        }
+    }
+    return false;
+}
+
 /// Prints all that is there, and with `follow` what comes, until the reader of the output is gone.
 int print(StoreReader& reader, StoreFilter filter, const CommandArguments& arguments, Console& console) {
-    const bool json = arguments.has("--json");
     const bool follow = arguments.has("--follow");
-    bool printed = false;
+    DeliveryPrinter printer(arguments.has("--json"), console);
     for (;;) {
         const auto page = reader.read(filter);
         if (!page) {
             return fail(page.failure(), console);
         }
         if (!page->empty()) {
-            printed = true;
             filter.after = page->back().seq;
-            if (json) {
-                for (const StoredDelivery& delivery : *page) {
-                    printJson(delivery, console.out);
-                }
-            } else {
-                printTable(*page, console);
-            }
-            console.out.flush();
-            if (!console.out) {
+            if (!printer.print(*page)) {
                 return kFailed;
             }
             continue;
         }
         if (!follow) {
-            if (!printed && !json) {
-                console.out << "No deliveries\n";
-            }
+            printer.finish();
             return kDone;
         }
-        if (const auto changed = reader.waitForChange(kFollowWait); !changed) {
-            return fail(changed.failure(), console);
+        const platform::Result<bool> more = waitForMore(reader, console);
+        if (!more) {
+            return fail(more.failure(), console);
+        }
+        if (!*more) {
+            return kDone;
         }
     }
 }
@@ -184,7 +222,12 @@ int runDeliveries(std::span<const std::string_view> arguments, Console& console)
     if (!loaded) {
         return kFailed;
     }
-    auto opened = StoreReader::open(loaded->reading.settings->store.path);
+    const std::string& path = loaded->reading.settings->store.path;
+    std::error_code ignored;
+    if (std::filesystem::is_directory(path, ignored)) {
+        return fail({EISDIR, path + " is a folder and no store"}, console);
+    }
+    auto opened = StoreReader::open(path);
     if (!opened) {
         return fail(opened.failure(), console);
     }

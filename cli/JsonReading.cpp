@@ -1,5 +1,6 @@
 #include "cli/JsonReading.h"
 
+#include "common/SettingValues.h"
 #include "common/values/Dictionary.h"
 
 #include <cstdint>
@@ -21,9 +22,20 @@ std::optional<int> base64Digit(char letter) {
     return digit == std::string_view::npos ? std::nullopt : std::optional(static_cast<int>(digit));
 }
 
-std::optional<std::string> fromBase64(std::string_view text) {
-    while (text.ends_with('=')) {
-        text.remove_suffix(1);
+platform::Failure noBase64(std::string_view text, const std::string& reason) {
+    return {0, "\"$data\" is not base64: " + shownValue(std::string(text)) + ' ' + reason};
+}
+
+/// The padding may be left out.
+platform::Result<std::string> fromBase64(std::string_view padded) {
+    constexpr std::size_t kGroup = 4;
+    const std::string_view text = padded.substr(0, padded.find_last_not_of('=') + 1);
+    const std::size_t padding = padded.size() - text.size();
+    if (text.size() % kGroup == 1) {
+        return noBase64(padded, "has " + std::to_string(text.size()) + " digits, one more than a multiple of 4");
+    }
+    if (padding != 0 && padding != (kGroup - text.size() % kGroup) % kGroup) {
+        return noBase64(padded, "ends with \"=\", but not so that its length is the next multiple of 4");
     }
     std::string bytes;
     std::uint32_t collected = 0;
@@ -31,7 +43,7 @@ std::optional<std::string> fromBase64(std::string_view text) {
     for (const char letter : text) {
         const std::optional<int> digit = base64Digit(letter);
         if (!digit) {
-            return std::nullopt;
+            return noBase64(padded, "has other characters than A-Z, a-z, 0-9, +, / and a padding of =");
         }
         collected = (collected << 6U) | static_cast<std::uint32_t>(*digit);
         bits += 6;
@@ -41,6 +53,16 @@ std::optional<std::string> fromBase64(std::string_view text) {
         }
     }
     return bytes;
+}
+
+/// `number` for a message: the beginning of a long one.
+std::string shownNumber(std::string_view number) {
+    constexpr std::size_t kShown = 80;
+    return std::string(number.substr(0, kShown)) + (number.size() > kShown ? "..." : "");
+}
+
+bool isWholeNumber(std::string_view number) {
+    return number.find_first_not_of("-0123456789") == std::string_view::npos;
 }
 
 /// Takes the parser's events and builds the value. Every event answers whether to go on.
@@ -60,7 +82,10 @@ public:
     bool boolean(bool value) { return put(value); }
     bool number_integer(number_integer_t value) { return put(value); }
     bool number_unsigned(number_unsigned_t value) { return put(value); }
-    bool number_float(number_float_t value, const string_t&) { return put(value); }
+    /// Whole numbers come here as well where 64 bits do not hold them.
+    bool number_float(number_float_t value, const string_t& text) {
+        return isWholeNumber(text) ? refuseNumber(text) : put(value);
+    }
     bool string(string_t& value) { return put(std::string_view(value)); }
     bool binary(binary_t&) { return refuse("there are no bytes in JSON"); }
     bool start_object(std::size_t) { return open(true); }
@@ -79,7 +104,11 @@ public:
         levels_.pop_back();
         return put(std::move(array));
     }
-    bool parse_error(std::size_t position, const std::string&, const nlohmann::detail::exception&) {
+    bool parse_error(std::size_t position, const std::string& token, const nlohmann::detail::exception& exception) {
+        constexpr int kNumberOverflow = 406;
+        if (exception.id == kNumberOverflow) {
+            return refuseNumber(token);
+        }
         return refuse("no JSON at byte " + std::to_string(position));
     }
     // NOLINTEND(readability-identifier-naming)
@@ -118,14 +147,20 @@ private:
             const ValueRef data = dictionary.find(kDataKey);
             const ValueRef date = dictionary.find(kDateKey);
             if (data.isString()) {
-                const std::optional<std::string> bytes = fromBase64(data.text());
-                return bytes ? put(Data(*bytes)) : refuse("\"$data\" is not base64");
+                const platform::Result<std::string> bytes = fromBase64(data.text());
+                return bytes ? put(Data(*bytes)) : refuse(bytes.failure().description);
             }
             if (date.isNumber()) {
                 return put(Date{date.doubleValue()});
             }
         }
         return put(dictionary);
+    }
+
+    bool refuseNumber(std::string_view text) {
+        return refuse(shownNumber(text) + (isWholeNumber(text)
+                                               ? " is no whole number from -9223372036854775808 to 18446744073709551615"
+                                               : " is beyond the largest real, 1.7976931348623157e308"));
     }
 
     bool refuse(std::string fault) {

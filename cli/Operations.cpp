@@ -1,7 +1,9 @@
 #include "cli/Operations.h"
 
+#include "common/SettingValues.h"
 #include "common/VelaReportingUtility.h"
 #include "common/values/Dictionary.h"
+#include "common/values/Json.h"
 #include "platform/dbus/MessageWriter.h"
 #include "platform/dbus/Protocol.h"
 
@@ -45,44 +47,59 @@ platform::Failure wrong(const OperationArgument& argument, const std::string& re
     return {0, std::string(argument.name) + " " + reason};
 }
 
-/// The number of `name` among those that `nameOf` names; the highest is `last`.
-template <class NameOf>
-std::optional<std::int64_t> numberOfName(std::string_view name, std::uint32_t last, NameOf nameOf) {
-    for (std::uint32_t number = 1; number <= last; ++number) {
-        if (nameOf(number) == name) {
-            return number;
+struct NamedNumber {
+    std::string name;
+    std::int64_t number;
+};
+
+/// What names stand for numbers of a kind: those that the service prints for one number only, so neither the category
+/// "Undefined" nor the type "Generic".
+std::vector<NamedNumber> namedNumbers(ArgumentKind kind) {
+    std::vector<NamedNumber> names;
+    if (kind == ArgumentKind::ServiceType) {
+        for (std::uint32_t type = AudioServiceTypeGeneric; type <= AudioServiceTypeSystemSounds; ++type) {
+            names.push_back({std::string(VelaReportingUtilityGenerateServiceNameFromServiceType(type)), type});
         }
+        names.push_back({"unknown", AudioServiceTypeUnknown});
+    } else if (kind == ArgumentKind::Category) {
+        for (std::uint32_t category = AudioEventCategoryGeneric; category <= AudioEventCategoryHearingHealth;
+             ++category) {
+            names.push_back({VelaReportingUtilityCategoryString(category), category});
+        }
+    } else if (kind == ArgumentKind::EventType) {
+        for (std::uint32_t type = AudioEventTypeStart; type <= AudioEventTypeState; ++type) {
+            names.push_back({std::string(VelaReportingUtilityTypeString(type)), type});
+        }
+        names.push_back({"Unknown", AudioEventTypeUnknown});
     }
-    return std::nullopt;
+    return names;
 }
 
-std::optional<std::int64_t> numberOfName(ArgumentKind kind, std::string_view name) {
-    constexpr std::uint32_t kLastCategory = AudioEventCategoryHearingHealth;
-    constexpr std::uint32_t kLastType = AudioEventTypeState;
-    switch (kind) {
-    case ArgumentKind::ServiceType: {
-        const AudioServiceType type = VelaReportingUtilityGenerateServiceTypeFromServiceName(name);
-        return type != AudioServiceTypeUnknown || name == "unknown" ? std::optional<std::int64_t>(type) : std::nullopt;
+/// A text or number for a message, with a space behind it; nothing for a container, which may be of any size.
+std::string shownWithSpace(ValueRef value) {
+    if (value.isString()) {
+        return shownValue(std::string(value.text())) + ' ';
     }
-    case ArgumentKind::Category:
-        return numberOfName(name, kLastCategory, VelaReportingUtilityCategoryString);
-    case ArgumentKind::EventType:
-        return numberOfName(name, kLastType, VelaReportingUtilityTypeString);
-    default:
-        return std::nullopt;
-    }
+    return value.isArray() || value.isDictionary() ? "" : jsonText(value) + ' ';
 }
 
 platform::Result<std::int64_t> numberOf(const OperationArgument& argument, ValueRef value, std::int64_t least,
                                         std::int64_t most) {
+    if (value.kind() == ValueKind::Integer && value.integer() >= least && value.integer() <= most) {
+        return value.integer();
+    }
+    const std::vector<NamedNumber> names = namedNumbers(argument.kind);
     if (value.isString()) {
-        const std::optional<std::int64_t> number = numberOfName(argument.kind, value.text());
-        return number ? platform::Result(*number) : wrong(argument, "is no known name");
+        if (const auto found = std::ranges::find(names, value.text(), &NamedNumber::name); found != names.end()) {
+            return found->number;
+        }
     }
-    if (value.kind() != ValueKind::Integer || value.integer() < least || value.integer() > most) {
-        return wrong(argument, "is no whole number from " + std::to_string(least) + " to " + std::to_string(most));
+    std::string reason =
+        shownWithSpace(value) + "is no whole number from " + std::to_string(least) + " to " + std::to_string(most);
+    for (const NamedNumber& named : names) {
+        reason += (&named == &names.front() ? " and none of the names " : ", ") + named.name;
     }
-    return value.integer();
+    return wrong(argument, reason);
 }
 
 platform::Result<std::vector<std::int64_t>> reporterIDs(const OperationArgument& argument, ValueRef value) {
@@ -205,7 +222,10 @@ platform::Result<platform::Done> appendCall(std::string& bytes, std::uint32_t se
         return *fault;
     }
     if (!writer.finish()) {
-        return platform::Failure{0, "the arguments are too large for one call"};
+        return platform::Failure{0, "the arguments are too large for one call: a D-Bus message has at most " +
+                                        byteSizeText(std::int64_t{dbus::kMaximumMessageBytes}) +
+                                        ", an array or data in it " +
+                                        byteSizeText(std::int64_t{dbus::kMaximumArrayBytes})};
     }
     return platform::Done();
 }

@@ -13,6 +13,7 @@ using platform::dbus::MessageHeader;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using ::testing::Optional;
+using ::testing::StartsWith;
 
 std::string faultOf(std::string_view name, const std::vector<Value>& arguments) {
     std::string bytes = "before";
@@ -70,13 +71,8 @@ TEST(OperationsTest, WithoutReporterIDsAMessageGoesToAll) {
 }
 
 TEST(OperationsTest, AWrongArgumentIsNamed) {
-    EXPECT_EQ(faultOf("setServiceType", {65536, 1}), "SERVICE-TYPE is no whole number from 0 to 65535");
-    EXPECT_EQ(faultOf("setServiceType", {"music", 1}), "SERVICE-TYPE is no known name");
-    EXPECT_EQ(faultOf("sendMessage", {Dictionary(), -1, 1}), "CATEGORY is no whole number from 0 to 4294967295");
     EXPECT_EQ(faultOf("sendMessage", {"a", 1, 1}), "MESSAGE is no dictionary");
     EXPECT_EQ(faultOf("sendMessage", {Dictionary(), 1, 1, Array{"a"}}), "REPORTER-IDS is no list of whole numbers");
-    EXPECT_EQ(faultOf("createReportingSession", {1.0}),
-              "REPORTER-ID is no whole number from -9223372036854775808 to 9223372036854775807");
 }
 
 TEST(OperationsTest, AWrongNumberOfArgumentsShowsTheUsage) {
@@ -102,6 +98,54 @@ TEST(OperationsTest, AReplyOfAnotherKindIsRefused) {
     ASSERT_TRUE(value);
     EXPECT_EQ(*value, Value(true));
     EXPECT_FALSE(replyValue(*findOperation("getAllReporters"), header));
+}
+
+TEST(OperationsTest, ATextIsNoReporterID) {
+    const std::string range = "is no whole number from -9223372036854775808 to 9223372036854775807";
+    EXPECT_EQ(faultOf("createReportingSession", {"player"}), "REPORTER-ID \"player\" " + range);
+    EXPECT_EQ(faultOf("createReportingSession", {"42"}), "REPORTER-ID \"42\" " + range);
+    EXPECT_EQ(faultOf("createReportingSession", {1.0}), "REPORTER-ID 1.0 " + range);
+    EXPECT_EQ(faultOf("createReportingSession", {true}), "REPORTER-ID true " + range);
+    EXPECT_EQ(faultOf("createReportingSession", {Array{1, 2}}), "REPORTER-ID " + range);
+    EXPECT_EQ(faultOf("createReportingSession", {std::uint64_t{9223372036854775808U}}),
+              "REPORTER-ID 9223372036854775808 " + range);
+}
+
+TEST(OperationsTest, WhatIsNeitherANumberNorANameIsShownWithTheNames) {
+    const std::string serviceTypes =
+        "is no whole number from 0 to 65535 and none of the names generic, muse, telephony, haptics, alarms, "
+        "standalone, soundautoconfig, longformaudio, nonlongformaudio, audiodeviceusage, alerts, test, apiusage, "
+        "systemsounds, unknown";
+    EXPECT_EQ(faultOf("setServiceType", {"music", 1}), "SERVICE-TYPE \"music\" " + serviceTypes);
+    EXPECT_EQ(faultOf("setServiceType", {65536, 1}), "SERVICE-TYPE 65536 " + serviceTypes);
+    const std::string categories =
+        "is no whole number from 0 to 4294967295 and none of the names Generic, Record, Input, Playback, Output, "
+        "PlaybackAndRecord, IO, Setup, ClientRequest, RouteChange, Error, HwStatsing, Performance, Volume, "
+        "HearingHealth";
+    EXPECT_EQ(faultOf("sendMessage", {Dictionary(), -1, 1}), "CATEGORY -1 " + categories);
+    EXPECT_EQ(faultOf("sendMessage", {Dictionary(), "playback", 1}), "CATEGORY \"playback\" " + categories);
+    EXPECT_EQ(faultOf("sendMessage", {Dictionary(), 1, "Started"}),
+              "TYPE \"Started\" is no whole number from 0 to 65535 and none of the names Start, Stop, Activate, "
+              "Deactivate, Setup, Error, IssueDetector, Joule, AudioUnitUsage, MIDIDriver, Summary, "
+              "HeadphoneAudioExposure, AudioExposure, Listeningenhancement, Gauge, Simple, Histogram, State, Unknown");
+}
+
+TEST(OperationsTest, NamesThatSeveralNumbersHaveStandForNone) {
+    const Call call("sendMessage", {Dictionary(), "Generic", "Unknown"});
+    BodyReader body(call.header);
+    body.dictionary();
+    EXPECT_EQ(body.uint32(), 1U);
+    EXPECT_EQ(body.uint16(), 65535);
+    EXPECT_THAT(faultOf("sendMessage", {Dictionary(), "Undefined", 1}), StartsWith("CATEGORY \"Undefined\" is no "));
+    EXPECT_THAT(faultOf("sendMessage", {Dictionary(), 1, "Generic"}), StartsWith("TYPE \"Generic\" is no "));
+}
+
+TEST(OperationsTest, ArgumentsBeyondTheLimitsOfAMessageNameThem) {
+    const std::string bytes(std::size_t{64} * 1024 * 1024 + 1, 'a');
+    EXPECT_EQ(
+        faultOf("setConfiguration", {Dictionary{{"data", Data(bytes)}}, 42}),
+        "the arguments are too large for one call: a D-Bus message has at most 128 MiB, an array or data in it 64 "
+        "MiB");
 }
 
 } // namespace

@@ -1,4 +1,5 @@
 // The built velactl, and the files of packaging/ that describe what it shows.
+#include "cli/PackagedFile_integrationtest.h"
 #include "common/SettingValues.h"
 #include "common/SettingsTable.h"
 #include "testing/RunProgram.h"
@@ -8,21 +9,12 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <regex>
-#include <sstream>
 
 namespace vela {
 namespace {
 
 using ::testing::HasSubstr;
 using ::testing::StartsWith;
-
-std::string contentOf(const std::string& path) {
-    std::ifstream stream(path, std::ios::binary);
-    EXPECT_TRUE(stream.is_open()) << path;
-    std::ostringstream content;
-    content << stream.rdbuf();
-    return content.str();
-}
 
 class VelactlProgramTest : public ::testing::Test {
 protected:
@@ -103,6 +95,13 @@ TEST_F(VelactlProgramTest, APropertyListIsPrintedInAnotherForm) {
 TEST_F(VelactlProgramTest, OutputThatCannotBeWrittenIsAFailure) {
     const testing::ProgramRun full = testing::runProgram({"/bin/sh", "-c", R"("$0" --help >/dev/full)", VELACTL}, {});
     EXPECT_EQ(full.status, 1);
+    EXPECT_EQ(full.error, "velactl: standard output cannot be written: No space left on device\n");
+}
+
+TEST_F(VelactlProgramTest, OutputThatIsClosedIsAFailure) {
+    const testing::ProgramRun closed = testing::runProgram({"/bin/sh", "-c", R"("$0" --help >&-)", VELACTL}, {});
+    EXPECT_EQ(closed.status, 1);
+    EXPECT_EQ(closed.error, "velactl: standard output cannot be written: Bad file descriptor\n");
 }
 
 TEST_F(VelactlProgramTest, ThePackagedSettingsFileIsTheTable) {
@@ -134,15 +133,6 @@ TEST_F(VelactlProgramTest, ThePackagedSettingsFileWithoutItsMarksIsTheDefaults) 
     EXPECT_EQ(fromFile, settingsTable().size() - 2); // the two folders were set over it
 }
 
-/// The text of a man page's source, without what escapes and fonts add.
-std::string plainText(std::string roff) {
-    for (const auto& [from, to] :
-         {std::pair{R"(\\\(dq)", "\""}, {R"(\\e)", R"(\)"}, {R"(\\-)", "-"}, {R"(\\ )", " "}}) {
-        roff = std::regex_replace(roff, std::regex(from), to);
-    }
-    return roff;
-}
-
 TEST_F(VelactlProgramTest, TheManPageOfTheSettingsHoldsEverySettingInOrder) {
     const std::string page = plainText(contentOf(VELA_PACKAGING "/man/vela-reporting.toml.5"));
     std::size_t at = 0;
@@ -160,6 +150,62 @@ TEST_F(VelactlProgramTest, TheManPageOfTheSettingsHoldsEverySettingInOrder) {
         ASSERT_NE(allowed, std::string::npos) << setting.name();
         EXPECT_EQ(page.substr(at + 1, allowed - at).find("\n.TP\n"), std::string::npos) << setting.name();
     }
+}
+
+TEST_F(VelactlProgramTest, PreferencesAreATableOrJsonLines) {
+    const auto defaults = [this](std::vector<std::string> words) {
+        words.insert(words.begin(), "defaults");
+        words.insert(words.end(), {"--set", "paths.state=" + folder_.path()});
+        return run(words);
+    };
+    EXPECT_EQ(defaults({"read", "com.orvex.vela"}).out, "No preferences\n");
+    EXPECT_EQ(defaults({"read", "com.orvex.vela", "--json"}).out, "");
+    EXPECT_EQ(defaults({"write", "com.orvex.vela", "device_name", "Kitchen"}).status, 0);
+    EXPECT_EQ(defaults({"write", "com.orvex.vela", "list", "[1, {\"a\": true}]"}).status, 0);
+    EXPECT_EQ(defaults({"read", "com.orvex.vela"}).out, "KEY          VALUE\n"
+                                                        "device_name  \"Kitchen\"\n"
+                                                        "list         [1,{\"a\":true}]\n");
+    EXPECT_EQ(defaults({"read", "com.orvex.vela", "--json"}).out, "{\"key\":\"device_name\",\"value\":\"Kitchen\"}\n"
+                                                                  "{\"key\":\"list\",\"value\":[1,{\"a\":true}]}\n");
+    EXPECT_EQ(defaults({"read", "com.orvex.vela", "device_name"}).out, "\"Kitchen\"\n");
+    EXPECT_EQ(defaults({"read", "com.orvex.vela", "device_name", "--json"}).out,
+              "{\"key\":\"device_name\",\"value\":\"Kitchen\"}\n");
+}
+
+TEST_F(VelactlProgramTest, WhatOnlyLooksLikeJsonIsNoPreference) {
+    const auto defaults = [this](std::vector<std::string> words) {
+        words.insert(words.begin(), "defaults");
+        words.insert(words.end(), {"--set", "paths.state=" + folder_.path()});
+        return run(words);
+    };
+    for (const std::string text : {"[1,2", "{\"a\":", "\"x", "null", "18446744073709551616", "1e999"}) {
+        const testing::ProgramRun refused = defaults({"write", "com.orvex.vela", "a", text});
+        EXPECT_EQ(refused.status, 1) << text;
+        EXPECT_THAT(refused.error, ::testing::HasSubstr("; a text like this needs quotation marks of its own\n"));
+    }
+    EXPECT_EQ(defaults({"write", "com.orvex.vela", "a", "12:30"}).status, 0);
+    EXPECT_EQ(defaults({"read", "com.orvex.vela", "a"}).out, "\"12:30\"\n");
+}
+
+TEST_F(VelactlProgramTest, AKeyOrAllKeysOfADomainAreDeleted) {
+    const auto defaults = [this](std::vector<std::string> words) {
+        words.insert(words.begin(), "defaults");
+        words.insert(words.end(), {"--set", "paths.state=" + folder_.path()});
+        return run(words);
+    };
+    for (const char* key : {"a", "b", "c"}) {
+        EXPECT_EQ(defaults({"write", "com.orvex.vela", key, "1"}).status, 0);
+    }
+    EXPECT_EQ(defaults({"write", "com.orvex.audio", "a", "1"}).status, 0);
+    EXPECT_EQ(defaults({"delete", "com.orvex.vela", "a"}).status, 0);
+    EXPECT_EQ(defaults({"read", "com.orvex.vela"}).out, "KEY  VALUE\nb    1\nc    1\n");
+    const testing::ProgramRun all = defaults({"delete", "com.orvex.vela"});
+    EXPECT_EQ(all.status, 0) << all.error;
+    EXPECT_EQ(defaults({"read", "com.orvex.vela"}).out, "No preferences\n");
+    EXPECT_EQ(defaults({"read", "com.orvex.audio"}).out, "KEY  VALUE\na    1\n");
+    const testing::ProgramRun again = defaults({"delete", "com.orvex.vela"});
+    EXPECT_EQ(again.status, 1);
+    EXPECT_EQ(again.error, "velactl: com.orvex.vela has no preferences\n");
 }
 
 } // namespace

@@ -1,7 +1,7 @@
 // velactl run
-#include "cli/JsonReading.h"
 #include "cli/MessageTimes.h"
 #include "cli/Operations.h"
+#include "cli/RunSteps.h"
 #include "cli/ServiceConnection.h"
 #include "cli/Subcommand.h"
 #include "common/CommandOptions.h"
@@ -11,86 +11,24 @@
 #include "platform/dbus/Protocol.h"
 #include "platform/linux/LinuxClock.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <deque>
 #include <fstream>
-#include <istream>
 #include <ostream>
-#include <thread>
+#include <span>
+#include <system_error>
 #include <vector>
 
 namespace vela {
 
 namespace {
 
-/// One line of the file.
-struct Step {
-    std::size_t line = 0;
-    const Operation* operation = nullptr; ///< null for a pause
-    std::vector<Value> arguments;
-    double seconds = 0; ///< of a pause
-};
-
-platform::Result<Step> readStep(std::string_view text) {
-    const platform::Result<Value> value = readJson(text);
-    if (!value) {
-        return value.failure();
-    }
-    if (!value->ref().isDictionary()) {
-        return platform::Failure{0, R"(a line is {"call":"OPERATION","args":[...]} or {"sleep":SECONDS})"};
-    }
-    const Dictionary line = value->ref().dictionary();
-    Step step;
-    if (const ValueRef seconds = line.find("sleep"); line.size() == 1 && seconds.isNumber()) {
-        constexpr double kLongest = 86400;
-        step.seconds = seconds.doubleValue();
-        if (!(step.seconds >= 0 && step.seconds <= kLongest)) {
-            return platform::Failure{0, "a pause has 0 to 86400 seconds"};
-        }
-        return step;
-    }
-    const ValueRef call = line.find("call");
-    const ValueRef arguments = line.find("args");
-    step.operation = call.isString() ? findOperation(call.text()) : nullptr;
-    if (step.operation == nullptr || (arguments && !arguments.isArray()) || line.size() != (arguments ? 2U : 1U)) {
-        return platform::Failure{0, R"(a line is {"call":"OPERATION","args":[...]} or {"sleep":SECONDS})"};
-    }
-    if (arguments) {
-        const Array array = arguments.array();
-        for (const ValueRef argument : array) {
-            step.arguments.emplace_back(argument);
-        }
-    }
-    return step;
-}
-
-/// All steps, each tried out: nothing is sent of a file that has a fault. A failure's text goes behind the file's name.
-platform::Result<std::vector<Step>> readSteps(std::istream& in) {
-    std::vector<Step> steps;
-    std::string text;
-    for (std::size_t line = 1; std::getline(in, text); ++line) {
-        const std::size_t first = text.find_first_not_of(" \t\r");
-        if (first == std::string::npos || text[first] == '#') {
-            continue;
-        }
-        platform::Result<Step> step = readStep(text);
-        std::string ignored;
-        if (step && step->operation != nullptr) {
-            if (const auto fault = appendCall(ignored, 1, *step->operation, step->arguments); !fault) {
-                step = fault.failure();
-            }
-        }
-        if (!step) {
-            return platform::Failure{0, ":" + std::to_string(line) + ": " + step.failure().description};
-        }
-        steps.push_back(*std::move(step));
-        steps.back().line = line;
-    }
-    if (in.bad()) {
-        return platform::Failure{0, " cannot be read to its end"};
-    }
-    return steps;
-}
+using platform::Done;
+using platform::Failure;
+using platform::Nanoseconds;
+using platform::Result;
 
 /// Sends the steps one after another without waiting for replies, which are printed in the order of the lines.
 class StepRunner {
@@ -99,20 +37,27 @@ public:
         : connection_(connection),
           console_(console) {}
 
-    int run(const std::vector<Step>& steps) {
-        for (const Step& step : steps) {
-            if (step.operation == nullptr) {
-                console_.out.flush();
-                std::this_thread::sleep_for(std::chrono::duration<double>(step.seconds));
-            } else if (!send(step)) {
-                return status_;
+    int run(std::span<const RunStep> steps) {
+        while (!steps.empty()) {
+            const RunStep& step = steps.front();
+            steps = steps.subspan(1);
+            if (const Result<Done> done = step.operation == nullptr ? pause(step.seconds) : send(step); !done) {
+                const bool callsAreLeft =
+                    std::ranges::any_of(steps, [](const RunStep& left) { return left.operation; });
+                return endWith(done.failure(), callsAreLeft);
             }
             printWhatCame();
         }
         while (!pending_.empty()) {
-            if (!printNext()) {
-                return status_;
+            if (!connection_.hasReply(pending_.front().serial)) {
+                console_.out.flush();
             }
+            const auto reply = connection_.receive(pending_.front().serial, kReplyPatience);
+            if (!reply) {
+                return endWith(reply.failure(), false);
+            }
+            print(pending_.front(), *reply);
+            pending_.pop_front();
         }
         return status_;
     }
@@ -124,45 +69,89 @@ private:
         std::uint32_t serial;
     };
 
-    bool send(const Step& step) {
+    Result<Done> send(const RunStep& step) {
         const std::uint32_t serial = connection_.nextSerial();
         std::string bytes;
         std::vector<Value> arguments = step.arguments;
         addMessageTimes(*step.operation, arguments, clock_, start_);
         if (const auto written = appendCall(bytes, serial, *step.operation, arguments); !written) {
-            return fail(written.failure());
+            return written.failure();
         }
         pending_.push_back({step.line, step.operation, serial});
-        const auto sent = connection_.send(bytes);
-        return sent ? true : fail(sent.failure());
+        return connection_.send(bytes, kReplyPatience);
+    }
+
+    /// Whoever watches sees the replies when they come, not when the pause is over.
+    Result<Done> pause(double seconds) {
+        const auto length = std::chrono::duration_cast<Nanoseconds>(std::chrono::duration<double>(seconds));
+        const platform::MonotonicTime end = clock_.monotonicNow() + length;
+        for (;;) {
+            printWhatCame();
+            console_.out.flush();
+            const Result<bool> came = connection_.takeIn(end - clock_.monotonicNow());
+            if (!came) {
+                return came.failure();
+            }
+            if (!*came) {
+                return Done();
+            }
+        }
     }
 
     void printWhatCame() {
-        while (!pending_.empty() && connection_.hasReply(pending_.front().serial) && printNext()) {
+        while (!pending_.empty() && connection_.hasReply(pending_.front().serial)) {
+            printReply(pending_.front());
+            pending_.pop_front();
         }
     }
 
-    bool printNext() {
-        const Pending next = pending_.front();
-        auto reply = connection_.receive(next.serial, kReplyPatience);
-        if (!reply && next.operation->name == platform::dbus::kKillService && reply.failure().code == ECONNRESET) {
-            pending_.clear();
-            return false; // it never replies
+    /// Prints every reply that came before the failure. A connection that ended because of a killService, which is
+    /// never answered, is a failure only for the calls that were to be answered.
+    int endWith(const Failure& failure, bool callsAreLeft) {
+        takeInRest(failure);
+        bool killed = false;
+        bool unanswered = callsAreLeft;
+        for (const Pending& call : pending_) {
+            if (connection_.hasReply(call.serial)) {
+                printReply(call);
+            } else if (!killed && failure.code == ECONNRESET && call.operation->name == platform::dbus::kKillService) {
+                killed = true;
+                DictionaryBuilder line;
+                beginLine(line, call);
+                printLine(line);
+            } else {
+                unanswered = true;
+            }
         }
-        if (!reply) {
-            return fail(reply.failure());
+        if (!killed || unanswered) {
+            console_.out.flush();
+            console_.error << "velactl: " << escapedText(failure.description) << '\n';
+            status_ = statusOf(failure);
         }
-        pending_.pop_front();
-        print(next, *reply);
-        return true;
+        return status_;
+    }
+
+    /// What a service sent before it closed the connection may still be there when a sending has failed.
+    void takeInRest(const Failure& failure) {
+        bool more = failure.code == ECONNRESET;
+        while (more) {
+            const Result<bool> came = connection_.takeIn(Nanoseconds::zero());
+            more = came && *came;
+        }
+    }
+
+    /// Of a reply that has come.
+    void printReply(const Pending& call) {
+        if (const auto reply = connection_.receive(call.serial, Nanoseconds::zero())) {
+            print(call, *reply);
+        }
     }
 
     void print(const Pending& call, const platform::dbus::Reply& reply) {
         DictionaryBuilder line;
-        line.add("line", call.line);
-        line.add("call", call.operation->name);
-        const platform::Result<Value> value =
-            reply.isError() ? platform::Failure{0, reply.errorText()} : replyValue(*call.operation, reply.header);
+        beginLine(line, call);
+        const Result<Value> value =
+            reply.isError() ? Failure{0, reply.errorText()} : replyValue(*call.operation, reply.header);
         if (value && *value) {
             line.add("reply", *value);
         } else if (!value) {
@@ -170,14 +159,15 @@ private:
             line.add("text", std::string_view(value.failure().description));
             status_ = kFailed;
         }
-        console_.out << jsonText(Value(line.build())) << '\n';
+        printLine(line);
     }
 
-    bool fail(const platform::Failure& failure) {
-        console_.error << "velactl: " << escapedText(failure.description) << '\n';
-        status_ = statusOf(failure);
-        return false;
+    static void beginLine(DictionaryBuilder& line, const Pending& call) {
+        line.add("line", call.line);
+        line.add("call", call.operation->name);
     }
+
+    void printLine(DictionaryBuilder& line) { console_.out << jsonText(Value(line.build())) << '\n'; }
 
     platform::dbus::BlockingConnection& connection_;
     Console& console_;
@@ -190,7 +180,7 @@ private:
 } // namespace
 
 int runRun(std::span<const std::string_view> arguments, Console& console) {
-    const platform::Result<CommandArguments> read = readArguments(arguments, {});
+    const Result<CommandArguments> read = readArguments(arguments, {});
     if (!read || read->operands.size() != 1) {
         return refuseUsage("run", read ? "one file is needed" : read.failure().description, console);
     }
@@ -199,11 +189,12 @@ int runRun(std::span<const std::string_view> arguments, Console& console) {
     if (file != "-") {
         opened.open(file);
         if (!opened) {
-            console.error << "velactl: " << escapedText(file) << " cannot be read\n";
+            const std::error_code reason(errno, std::system_category());
+            console.error << "velactl: " << escapedText(file) << " cannot be read: " << reason.message() << '\n';
             return kFailed;
         }
     }
-    const auto steps = readSteps(file == "-" ? console.in : opened);
+    const auto steps = readRunSteps(file == "-" ? console.in : opened);
     if (!steps) {
         console.error << "velactl: " << escapedText(file) << escapedText(steps.failure().description) << '\n';
         return kFailed;

@@ -25,7 +25,7 @@ platform::Result<dbus::Reply> callInspection(dbus::BlockingConnection& connectio
                       .signature = {},
                       .replyExpected = true});
     static_cast<void>(writer.finish()); // a call without arguments is never too large
-    if (const auto sent = connection.send(bytes); !sent) {
+    if (const auto sent = connection.send(bytes, kReplyPatience); !sent) {
         return sent.failure();
     }
     auto reply = connection.receive(serial, kReplyPatience);

@@ -15,14 +15,18 @@ namespace {
 constexpr std::array<Subcommand, 11> kSubcommands{{
     {"status", "[--ledger] [--json]", "what the service is doing, and what became of all deliveries", runStatus},
     {"sessions", "[--json]", "the reporting sessions of every client", runSessions},
-    {"call", "[OPERATION [JSON]...]", "calls one operation and prints the reply; alone it lists the operations",
-     runCall},
+    {"call", "[OPERATION [JSON]...] [--json]",
+     "calls one operation and prints the reply; alone it lists the operations", runCall},
     {"run", "FILE", "calls what a file of JSON Lines says, over one connection", runRun},
-    {"deliveries", "[--backend BACKEND] [--session ID] [--since TIME] [--follow] [--json]",
+    {"deliveries",
+     "[--backend BACKEND] [--session ID] [--since TIME] [--follow] [--json] [--settings FILE] "
+     "[--set SECTION.KEY=VALUE]...",
      "what was delivered to the back ends", runDeliveries},
-    {"defaults", "read DOMAIN [KEY] | write DOMAIN KEY VALUE | delete DOMAIN KEY",
+    {"defaults",
+     "(read DOMAIN [KEY] [--json] | write DOMAIN KEY VALUE | delete DOMAIN [KEY]) [--settings FILE] "
+     "[--set SECTION.KEY=VALUE]...",
      "reads and changes the preferences that the service reads", runDefaults},
-    {"notify", "NAME [STATE]", "posts a notification", runNotify},
+    {"notify", "NAME [STATE] [--settings FILE] [--set SECTION.KEY=VALUE]...", "posts a notification", runNotify},
     {"drivers", "[--settings FILE] [--set SECTION.KEY=VALUE]... [--watch [--count N]] [--json]",
      "the channels of driver statistics and their values", runDrivers},
     {"trace", kTraceArguments, "emits a kernel-trace event; reports what a trace run measured", runTrace},
@@ -50,8 +54,24 @@ void printHelp(std::ostream& out) {
         out << "  " << name << subcommand.summary << "\n  " << std::string(kNameColumns, ' ') << usageOf(subcommand)
             << "\n";
     }
-    out << "\n  --version   prints the version\n  --help      prints this text\n\n"
+    out << "\n  --version   prints the version\n  --help, -h  prints this text; behind a subcommand, how to use "
+           "that\n\n"
            "Exit status: 0 done, 1 failed, 2 wrong usage, 3 no service.\n";
+}
+
+bool isHelp(std::string_view argument) { return argument == "--help" || argument == "-h"; }
+
+/// What is asked for without a subcommand; nothing may follow it.
+int runAlone(std::span<const std::string_view> arguments, Console& console) {
+    if (arguments.size() > 1) {
+        return refuseUsage("", "there is nothing to do with " + quotedText(arguments[1]), console);
+    }
+    if (isHelp(arguments.front())) {
+        printHelp(console.out);
+    } else {
+        console.out << "velactl " VELA_VERSION "\n";
+    }
+    return kDone;
 }
 
 } // namespace
@@ -70,20 +90,15 @@ int runVelactl(std::span<const std::string_view> arguments, Console& console) {
         return refuseUsage("", "a subcommand is missing", console);
     }
     const std::string_view name = arguments.front();
-    if (name == "--help") {
-        printHelp(console.out);
-        return kDone;
-    }
-    if (name == "--version") {
-        console.out << "velactl " VELA_VERSION "\n";
-        return kDone;
+    if (isHelp(name) || name == "--version") {
+        return runAlone(arguments, console);
     }
     const Subcommand* subcommand = findSubcommand(name);
     if (subcommand == nullptr) {
         return refuseUsage("", "there is no subcommand " + escapedText(name), console);
     }
     const auto rest = arguments.subspan(1);
-    if (std::ranges::find(rest.begin(), std::ranges::find(rest, "--"), "--help") != std::ranges::find(rest, "--")) {
+    if (std::any_of(rest.begin(), std::ranges::find(rest, "--"), isHelp)) {
         console.out << "usage: " << usageOf(*subcommand) << "\n\n" << subcommand->summary << '\n';
         return kDone;
     }

@@ -1,6 +1,7 @@
 // The subcommands of velactl: one entry of a table each. Nothing here is thread-safe; the program has one thread.
 #pragma once
 
+#include <functional>
 #include <iosfwd>
 #include <span>
 #include <string_view>
@@ -20,6 +21,8 @@ struct Console {
     std::ostream& error;
     bool terminal = false; ///< whether `out` is one
     bool colour = false;   ///< whether `out` understands colours and its user wants them
+    /// Whether nobody reads `out` any more; null where nobody can tell.
+    std::function<bool()> isReaderGone = nullptr;
 };
 
 struct Subcommand {

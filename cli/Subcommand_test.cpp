@@ -1,5 +1,6 @@
 #include "cli/Subcommand.h"
 
+#include <algorithm>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <set>
@@ -59,6 +60,71 @@ TEST(VelactlTest, WrongUsageIsOneLineAndTwo) {
                 StartsWith("velactl: there is no option --jsn; usage: velactl settings ["));
     EXPECT_THAT(run({"settings", "x"}).error, StartsWith("velactl: there is nothing to do with \"x\"; usage: "));
     EXPECT_EQ(run({"settings", "--example", "--json"}).status, kWrongUsage);
+}
+
+TEST(VelactlTest, ThereIsAShortWordForHelp) {
+    EXPECT_EQ(run({"-h"}).status, kDone);
+    EXPECT_EQ(run({"-h"}).out, run({"--help"}).out);
+    EXPECT_EQ(run({"status", "-h"}).status, kDone);
+    EXPECT_EQ(run({"status", "-h"}).out, run({"status", "--help"}).out);
+    EXPECT_EQ(run({"trace", "emit", "-h"}).out, run({"trace", "--help"}).out);
+}
+
+TEST(VelactlTest, NothingFollowsHelpAndVersion) {
+    for (const std::string_view option : {"--help", "-h", "--version"}) {
+        const Outcome refused = run({option, "x"});
+        EXPECT_EQ(refused.status, kWrongUsage) << option;
+        EXPECT_EQ(refused.out, "") << option;
+        EXPECT_EQ(refused.error, "velactl: there is nothing to do with \"x\"; see velactl --help\n") << option;
+    }
+}
+
+TEST(VelactlCallTest, OperationsAreListed) {
+    const Outcome list = run({"call"});
+    EXPECT_EQ(list.status, kDone);
+    EXPECT_THAT(list.out, HasSubstr("\n  sendMessage MESSAGE CATEGORY TYPE [REPORTER-IDS]\n"));
+    EXPECT_EQ(run({"call", "--"}).out, list.out);
+}
+
+TEST(VelactlCallTest, OperationsAreJsonLines) {
+    const Outcome list = run({"call", "--json"});
+    EXPECT_EQ(list.status, kDone);
+    EXPECT_EQ(list.error, "");
+    EXPECT_THAT(list.out, StartsWith(R"({"operation":"createReportingSession","arguments":["REPORTER-ID"],)"
+                                     R"("signature":"x","reply_signature":"b"})"
+                                     "\n"));
+    EXPECT_THAT(list.out, HasSubstr("\n"
+                                    R"({"operation":"getAllReporters","arguments":[],)"
+                                    R"("signature":"","reply_signature":"ax"})"
+                                    "\n"));
+    EXPECT_EQ(std::ranges::count(list.out, '\n'), 11);
+}
+
+TEST(VelactlCallTest, WhatStandsBehindTheMarkIsAnOperationAndItsArguments) {
+    EXPECT_THAT(run({"call", "--", "reporterID", "x"}).error, StartsWith("velactl: argument 1: "));
+    EXPECT_THAT(run({"call", "--", "--json"}).error, StartsWith("velactl: there is no operation \"--json\"; usage: "));
+    EXPECT_THAT(run({"call", "reporterID", "--jsn"}).error, StartsWith("velactl: there is no option --jsn; usage: "));
+}
+
+TEST(VelactlDefaultsTest, WhatIsMissingOrTooMuchIsNamed) {
+    const auto reason = [](std::vector<std::string_view> words) {
+        words.insert(words.begin(), "defaults");
+        const Outcome refused = run(words);
+        EXPECT_EQ(refused.status, kWrongUsage);
+        EXPECT_THAT(refused.error, HasSubstr("; usage: velactl defaults (read DOMAIN [KEY] [--json] | write "));
+        return refused.error.substr(0, refused.error.find("; usage: "));
+    };
+    EXPECT_EQ(reason({}), "velactl: read, write or delete is missing");
+    EXPECT_EQ(reason({"list"}), "velactl: there is no \"list\", but read, write and delete");
+    EXPECT_EQ(reason({"read"}), "velactl: read: a domain is missing");
+    EXPECT_EQ(reason({"read", "d", "k", "v"}), "velactl: read: there is nothing to do with \"v\"");
+    EXPECT_EQ(reason({"write"}), "velactl: write: a domain is missing");
+    EXPECT_EQ(reason({"write", "d"}), "velactl: write: a key is missing");
+    EXPECT_EQ(reason({"write", "d", "k"}), "velactl: write: a value is missing");
+    EXPECT_EQ(reason({"write", "d", "k", "v", "w"}), "velactl: write: there is nothing to do with \"w\"");
+    EXPECT_EQ(reason({"delete"}), "velactl: delete: a domain is missing");
+    EXPECT_EQ(reason({"delete", "d", "k", "v"}), "velactl: delete: there is nothing to do with \"v\"");
+    EXPECT_EQ(reason({"delete", "d", "--json"}), "velactl: delete has nothing to print: --json goes with read");
 }
 
 TEST(VelactlPlistTest, WrongUsageIsTwo) {

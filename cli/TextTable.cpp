@@ -39,17 +39,39 @@ std::vector<std::size_t> TextTable::columns() const {
 void TextTable::print(std::ostream& out, bool colour) const {
     const std::vector<std::size_t> widths = columns();
     for (const Row& row : rows_) {
-        std::string line;
-        for (std::size_t column = 0; column < widths.size(); ++column) {
-            line += row.cells[column];
-            if (column + 1 < widths.size()) {
-                line.append(widths[column] - width(row.cells[column]) + kGap, ' ');
-            }
-        }
-        const bool heading = &row == &rows_.front();
-        const bool marked = colour && (heading || row.dim);
-        out << (marked ? (heading ? kBold : kDim) : "") << line << (marked ? kPlain : "") << '\n';
+        printRow(row, markOf(row, colour), widths, out);
     }
+}
+
+void TextTable::printPage(std::ostream& out, bool colour) {
+    const bool first = widths_.empty();
+    if (first) {
+        widths_ = columns();
+    }
+    for (std::size_t row = first ? 0 : 1; row < rows_.size(); ++row) {
+        printRow(rows_[row], markOf(rows_[row], colour), widths_, out);
+    }
+    rows_.resize(1);
+}
+
+std::string_view TextTable::markOf(const Row& row, bool colour) const {
+    if (!colour) {
+        return "";
+    }
+    return &row == &rows_.front() ? kBold : row.dim ? kDim : std::string_view();
+}
+
+void TextTable::printRow(const Row& row, std::string_view mark, const std::vector<std::size_t>& widths,
+                         std::ostream& out) {
+    std::string line;
+    for (std::size_t column = 0; column < widths.size(); ++column) {
+        line += row.cells[column];
+        if (column + 1 < widths.size()) {
+            const std::size_t used = width(row.cells[column]);
+            line.append(widths[column] - std::min(used, widths[column]) + kGap, ' ');
+        }
+    }
+    out << mark << line << (mark.empty() ? "" : kPlain) << '\n';
 }
 
 } // namespace vela

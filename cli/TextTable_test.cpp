@@ -43,5 +43,37 @@ TEST(TextTableTest, ColourMarksTheHeadingsAndDimRows) {
 
 TEST(TextTableTest, ATableWithoutRowsHasItsHeadings) { EXPECT_EQ(printed(TextTable({"A", "B"}), false), "A  B\n"); }
 
+TEST(TextTableTest, PagesHaveTheHeadingsOnceAndTheWidthsOfTheFirst) {
+    TextTable table({"SEQ", "NAME", "X"});
+    std::ostringstream out;
+    table.add({"9", "longer", "x"});
+    table.printPage(out, false);
+    EXPECT_EQ(out.str(), "SEQ  NAME    X\n9    longer  x\n");
+    out.str("");
+    table.add({"10", "a", "y"});
+    table.add({"1000", "longest", "z"});
+    table.printPage(out, false);
+    EXPECT_EQ(out.str(), "10   a       y\n1000  longest  z\n");
+}
+
+TEST(TextTableTest, APageWithoutNewRowsIsNothingButTheFirst) {
+    TextTable table({"A", "B"});
+    std::ostringstream out;
+    table.printPage(out, false);
+    table.printPage(out, false);
+    EXPECT_EQ(out.str(), "A  B\n");
+}
+
+TEST(TextTableTest, ColourMarksTheHeadingsAndDimRowsOfPages) {
+    TextTable table({"K", "V"});
+    std::ostringstream out;
+    table.add({"a", "1"});
+    table.printPage(out, true);
+    table.add({"b", "2"}, true);
+    table.add({"c", "3"});
+    table.printPage(out, true);
+    EXPECT_EQ(out.str(), "\033[1mK  V\033[0m\na  1\n\033[2mb  2\033[0m\nc  3\n");
+}
+
 } // namespace
 } // namespace vela

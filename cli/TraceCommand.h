@@ -9,7 +9,8 @@
 namespace vela {
 
 /// Their arguments, as the usage line of `velactl trace` names them.
-inline constexpr std::string_view kTraceArguments = "emit CODE [ARG]... | report FILE [--json]";
+inline constexpr std::string_view kTraceArguments =
+    "emit CODE [ARG]... [--settings FILE] [--set SECTION.KEY=VALUE]... | report FILE [--json]";
 
 int runTraceEmit(std::span<const std::string_view> arguments, Console& console);
 int runTraceReport(std::span<const std::string_view> arguments, Console& console);

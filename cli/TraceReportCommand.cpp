@@ -10,10 +10,13 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <charconv>
+#include <filesystem>
 #include <fstream>
 #include <istream>
 #include <ostream>
+#include <system_error>
 
 namespace vela {
 
@@ -101,6 +104,20 @@ void printJson(const TraceResultsFile& file, std::ostream& out) {
     }
 }
 
+/// Why the file cannot be opened, or 0. A folder could be, and not read.
+int open(const std::string& name, std::ifstream& file) {
+    std::error_code ignored;
+    if (std::filesystem::is_directory(name, ignored)) {
+        return EISDIR;
+    }
+    errno = 0;
+    file.open(name);
+    if (file) {
+        return 0;
+    }
+    return errno != 0 ? errno : EIO;
+}
+
 } // namespace
 
 int runTraceReport(std::span<const std::string_view> arguments, Console& console) {
@@ -111,9 +128,9 @@ int runTraceReport(std::span<const std::string_view> arguments, Console& console
     const std::string& name = read->operands.front();
     std::ifstream opened;
     if (name != "-") {
-        opened.open(name);
-        if (!opened) {
-            console.error << "velactl: " << escapedText(name) << " cannot be read\n";
+        if (const int error = open(name, opened); error != 0) {
+            console.error << "velactl: " << escapedText(name)
+                          << " cannot be read: " << std::generic_category().message(error) << '\n';
             return kFailed;
         }
     }

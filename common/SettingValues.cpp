@@ -31,20 +31,25 @@ platform::Failure badSize(std::string_view text, std::string_view reason) {
 
 void appendEscaped(std::string& quoted, char32_t codePoint) {
     constexpr std::string_view kDigits = "0123456789abcdef";
-    quoted += "\\u00";
-    quoted += kDigits[(codePoint >> 4U) & 0xfU];
-    quoted += kDigits[codePoint & 0xfU];
+    quoted += "\\u";
+    for (const unsigned shift : {12U, 8U, 4U, 0U}) {
+        quoted += kDigits[(codePoint >> shift) & 0xfU];
+    }
+}
+
+/// Breaks a line, moves a terminal's cursor, or changes the direction in which other characters are shown.
+bool isControl(char32_t codePoint) {
+    return codePoint < 0x20 || (codePoint >= 0x7f && codePoint < 0xa0) ||
+           (codePoint >= 0x200e && codePoint <= 0x200f) || (codePoint >= 0x2028 && codePoint <= 0x202e) ||
+           (codePoint >= 0x2066 && codePoint <= 0x2069);
 }
 
 void appendCharacter(std::string& quoted, char32_t codePoint) {
-    if (codePoint == U'"' || codePoint == U'\\') {
-        quoted += '\\';
-        appendUtf8(quoted, codePoint);
-    } else if (codePoint == U'\n') {
+    if (codePoint == U'\n') {
         quoted += "\\n";
     } else if (codePoint == U'\t') {
         quoted += "\\t";
-    } else if (codePoint < 0x20 || (codePoint >= 0x7f && codePoint < 0xa0)) {
+    } else if (isControl(codePoint)) {
         appendEscaped(quoted, codePoint);
     } else {
         appendUtf8(quoted, codePoint);
@@ -56,6 +61,9 @@ std::string quoted(std::string_view text, std::size_t limit) {
     std::size_t taken = 0;
     while (taken < text.size() && taken < limit) {
         const Utf8Step step = utf8Step(text.substr(taken));
+        if (step.valid && (step.codePoint == U'"' || step.codePoint == U'\\')) {
+            result += '\\';
+        }
         appendCharacter(result, step.valid ? step.codePoint : U'\uFFFD');
         taken += step.bytes;
     }
@@ -135,8 +143,13 @@ std::string byteSizeText(std::int64_t bytes) {
 std::string quotedText(std::string_view text) { return quoted(text, kEverything); }
 
 std::string escapedText(std::string_view text) {
-    const std::string marked = quotedText(text);
-    return marked.substr(1, marked.size() - 2);
+    std::string result;
+    while (!text.empty()) {
+        const Utf8Step step = utf8Step(text);
+        appendCharacter(result, step.valid ? step.codePoint : U'\uFFFD');
+        text.remove_prefix(step.bytes);
+    }
+    return result;
 }
 
 std::string shownValue(const SettingValue& value) { return anyText(value, kShownBytes, kShownTexts); }

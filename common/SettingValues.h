@@ -20,7 +20,7 @@ std::string byteSizeText(std::int64_t bytes);
 /// become U+FFFD.
 std::string quotedText(std::string_view text);
 
-/// `quotedText` without the quotation marks: an outside text that must not break a line.
+/// An outside text that must not break a line: control characters as in `quotedText`, all others as they are.
 std::string escapedText(std::string_view text);
 
 /// `value` as a settings file would say it, for messages: texts of more than 80 bytes and lists of more than 8 texts

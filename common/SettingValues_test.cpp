@@ -80,7 +80,16 @@ TEST(SettingTextTest, OtherCharactersStayAndBytesThatAreNoneBecomeTheReplacement
     EXPECT_EQ(quotedText("a\xff"), "\"a\xef\xbf\xbd\"");
 }
 
+TEST(SettingTextTest, CharactersThatChangeHowOthersAreShownAreEscaped) {
+    EXPECT_EQ(quotedText("\u202e\u2066\u200f\u2028"), R"("\u202e\u2066\u200f\u2028")");
+    EXPECT_EQ(quotedText("\u200d\u2014\u2065"), "\"\u200d\u2014\u2065\"");
+}
+
 TEST(SettingTextTest, EscapedTextHasNoMarksAround) { EXPECT_EQ(escapedText("a\nb"), "a\\nb"); }
+
+TEST(SettingTextTest, EscapedTextLeavesMarksThatStandInIt) {
+    EXPECT_EQ(escapedText("\"x\\y\" is none\u009b\xff"), "\"x\\y\" is none\\u009b\xef\xbf\xbd");
+}
 
 TEST(SettingTextTest, EveryKindOfValueHasItsText) {
     EXPECT_EQ(valueText(true), "true");

@@ -110,7 +110,7 @@ void addSpecial(Sink& json, std::string_view& text) {
     const Utf8Step step = utf8Step(text);
     if (!step.valid) {
         json.add("\xEF\xBF\xBD");
-    } else if (step.codePoint < 0x80) {
+    } else if (step.codePoint < 0xA0) { // also what moves a terminal's cursor
         addEscaped(json, step.codePoint);
     } else {
         json.add(text.substr(0, step.bytes));

@@ -57,6 +57,7 @@ TEST(JsonTest, StringsAreEscaped) {
     EXPECT_EQ(json("say \"no\" \\ /"), "\"say \\\"no\\\" \\\\ /\"");
     EXPECT_EQ(json("\b\f\n\r\t"), "\"\\b\\f\\n\\r\\t\"");
     EXPECT_EQ(json("\x01\x1f\x7f"), "\"\\u0001\\u001f\\u007f\"");
+    EXPECT_EQ(json("\u0080\u009b\u009f\u00a0"), "\"\\u0080\\u009b\\u009f\u00a0\"");
     EXPECT_EQ(json(std::string_view("a\0b", 3)), "\"a\\u0000b\"");
     EXPECT_EQ(json("caf\u00e9 \U0001F50A"), "\"caf\u00e9 \U0001F50A\"");
 }

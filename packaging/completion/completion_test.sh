@@ -69,6 +69,27 @@ offers _velactl "json xml binary text" velactl plist x --to ""
 offers _velactl "xml" velactl plist x --to x
 offers _velactl "--to" velactl plist --t
 offers _velactl "$folder/one file.toml" velactl plist "$folder/one"
+offers _velactl "" velactl settings --set log.level=
+offers _velactl "" velactl settings --set log.level =
+offers _velactl "" velactl settings --set log.level = d
+offers _velactl "" velactl settings --set log.level = --
+offers _velactl "" velactl trace report --set log.level = "$folder/o"
+offers _velactl "log.level=" velactl settings --set = log.l
+offers _velactl "log.target= log.level=" velactl settings --set =
+offers _velactl "" velactl settings --set = log.level =
+offers _velactl "$folder/one file.toml" velactl settings --settings = "$folder/o"
+offers _velactl "xml" velactl plist --to = x
+offers _velactl "--json --help" velactl call --
+offers _velactl "" velactl call createReportingSession ""
+offers _velactl "--json --settings --set --help" velactl defaults read com.orvex.vela --
+offers _velactl "--settings --set --help" velactl defaults delete com.orvex.vela --
+offers _velactl "--help" velactl run --
+offers _vela_reportingd "" vela-reportingd --check --set log.level =
+offers _vela_reportingd "" vela-reportingd --check --set log.level = --
+offers _vela_reportingd "" vela-reportingd --check --set log.level=
+offers _vela_reportingd "log.target=" vela-reportingd --check --set = log.t
+offers _vela_pipewire_reporter "" vela-pipewire-reporter --set statistics.folder = ""
+offers _vela_pipewire_reporter "" vela-pipewire-reporter --set statistics.folder=
 offers _vela_reportingd "--check --json --settings --set --version --help" vela-reportingd ""
 offers _vela_reportingd "--check" vela-reportingd --c
 offers _vela_reportingd "$folder/one file.toml" vela-reportingd --check --settings "$folder/"

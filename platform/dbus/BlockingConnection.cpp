@@ -3,9 +3,12 @@
 #include "platform/dbus/Authentication.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
+#include <charconv>
 #include <chrono>
 #include <cstring>
+#include <optional>
 #include <poll.h>
 #include <sys/socket.h>
 
@@ -20,6 +23,33 @@ Failure systemFailure(const std::string& what, int error) {
 std::uint32_t serialOf(const Reply& reply) { return reply.header.replySerial; }
 
 Failure closedFailure() { return {ECONNRESET, "the service closed the connection"}; }
+
+/// "10 seconds", "0.02 seconds"
+std::string secondsText(Nanoseconds time) {
+    std::array<char, 64> digits{};
+    const double seconds = std::chrono::duration<double>(time).count();
+    const auto written = std::to_chars(digits.data(), digits.data() + digits.size(), seconds, std::chars_format::fixed);
+    const std::string text(digits.data(), written.ptr);
+    return text + (text == "1" ? " second" : " seconds");
+}
+
+Failure silenceFailure(Nanoseconds patience) { return {ETIMEDOUT, "no answer within " + secondsText(patience)}; }
+
+/// What of `events` has come, or nothing when `patience` is over.
+Result<short> waitFor(int descriptor, short events, Nanoseconds patience) {
+    const Nanoseconds time = std::max(patience, Nanoseconds::zero());
+    const auto seconds = std::chrono::floor<std::chrono::seconds>(time);
+    const timespec limit{seconds.count(), (time - seconds).count()};
+    pollfd waiting{descriptor, events, 0};
+    int ready = -1;
+    do {
+        ready = ::ppoll(&waiting, 1, &limit, nullptr);
+    } while (ready < 0 && errno == EINTR);
+    if (ready < 0) {
+        return systemFailure("waiting for the service", errno);
+    }
+    return waiting.revents;
+}
 
 } // namespace
 
@@ -54,7 +84,7 @@ Result<BlockingConnection> BlockingConnection::open(FileDescriptor connected, Na
 
 Result<Done> BlockingConnection::authenticate(Nanoseconds patience) {
     // A service that refuses at once may have gone already, but not its answer.
-    const Result<Done> sent = send(ClientAuthentication::opening());
+    const Result<Done> sent = send(ClientAuthentication::opening(), patience);
     if (!sent && sent.failure().code != ECONNRESET) {
         return sent.failure();
     }
@@ -70,19 +100,23 @@ Result<Done> BlockingConnection::authenticate(Nanoseconds patience) {
             authenticated_ = true;
             return takeApart();
         }
-        if (const Result<Done> taken = takeIn(patience); !taken) {
-            return taken.failure().code == ETIMEDOUT
-                       ? Failure{0, "the service did not answer: " + taken.failure().description}
-                       : taken.failure();
+        const Result<bool> taken = takeIn(patience);
+        if (!taken) {
+            return taken.failure();
+        }
+        if (!*taken) {
+            return Failure{0, "the service did not answer: " + silenceFailure(patience).description};
         }
     }
 }
 
-Result<Done> BlockingConnection::send(std::string_view bytes) {
+Result<Done> BlockingConnection::send(std::string_view bytes, Nanoseconds patience) {
+    std::optional<MonotonicTime> deadline; // from when the service takes nothing in
     while (!bytes.empty()) {
         const ssize_t sent = ::send(descriptor_.get(), bytes.data(), bytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
         if (sent > 0) {
             bytes.remove_prefix(static_cast<std::size_t>(sent));
+            deadline.reset();
             continue;
         }
         if (errno == EPIPE || errno == ECONNRESET) {
@@ -91,19 +125,25 @@ Result<Done> BlockingConnection::send(std::string_view bytes) {
         if (errno != EAGAIN && errno != EINTR) {
             return systemFailure("sending to the service", errno);
         }
-        // A service that stops reading until its replies are read must not meet a client that does the same.
-        pollfd waiting{descriptor_.get(), POLLIN | POLLOUT, 0};
-        if (::poll(&waiting, 1, -1) > 0 && (waiting.revents & POLLIN) != 0) {
-            Result<Done> taken = takeWhatIsThere();
-            if (taken && authenticated_) {
-                taken = takeApart();
-            }
-            if (!taken) {
-                return taken;
-            }
+        const MonotonicTime now = std::chrono::steady_clock::now();
+        if (deadline && now >= *deadline) {
+            return Failure{ETIMEDOUT, "the service takes nothing in within " + secondsText(patience)};
+        }
+        deadline = deadline ? deadline : now + patience;
+        if (const Result<Done> waited = waitForRoom(*deadline - now); !waited) {
+            return waited.failure();
         }
     }
     return Done();
+}
+
+// A service that stops reading until its replies are read must not meet a client that does the same.
+Result<Done> BlockingConnection::waitForRoom(Nanoseconds patience) {
+    const Result<short> ready = waitFor(descriptor_.get(), POLLIN | POLLOUT, patience);
+    if (!ready) {
+        return ready.failure();
+    }
+    return (*ready & POLLIN) != 0 ? takeWhatIsThere() : Done();
 }
 
 Result<Reply> BlockingConnection::receive(std::uint32_t serial, Nanoseconds patience) {
@@ -114,34 +154,29 @@ Result<Reply> BlockingConnection::receive(std::uint32_t serial, Nanoseconds pati
             replies_.erase(found);
             return reply;
         }
-        Result<Done> taken = takeIn(patience);
-        if (taken) {
-            taken = takeApart();
-        }
+        const Result<bool> taken = takeIn(patience);
         if (!taken) {
             return taken.failure();
+        }
+        if (!*taken) {
+            return silenceFailure(patience);
         }
     }
 }
 
 // Waits by `ppoll`: a reading that waits is woken also whenever the service reads, and goes to sleep again for nothing.
-Result<Done> BlockingConnection::takeIn(Nanoseconds patience) {
-    const Nanoseconds time = std::max(patience, Nanoseconds::zero());
-    const auto seconds = std::chrono::floor<std::chrono::seconds>(time);
-    const timespec limit{seconds.count(), (time - seconds).count()};
-    pollfd waiting{descriptor_.get(), POLLIN, 0};
-    int ready = -1;
-    do {
-        ready = ::ppoll(&waiting, 1, &limit, nullptr);
-    } while (ready < 0 && errno == EINTR);
-    if (ready < 0) {
-        return systemFailure("waiting for the service", errno);
+Result<bool> BlockingConnection::takeIn(Nanoseconds patience) {
+    const Result<short> ready = waitFor(descriptor_.get(), POLLIN, patience);
+    if (!ready) {
+        return ready.failure();
     }
-    if (ready == 0) {
-        return Failure{ETIMEDOUT, "no answer within " +
-                                      std::to_string(std::chrono::duration<double>(patience).count()) + " seconds"};
+    if (*ready == 0) {
+        return false;
     }
-    return takeWhatIsThere();
+    if (const Result<Done> taken = takeWhatIsThere(); !taken) {
+        return taken.failure();
+    }
+    return true;
 }
 
 Result<Done> BlockingConnection::takeWhatIsThere() {
@@ -149,11 +184,6 @@ Result<Done> BlockingConnection::takeWhatIsThere() {
     if (got < 0 && (errno == EAGAIN || errno == EINTR)) {
         return Done();
     }
-    return keep(got);
-}
-
-// `got`: what a reading into scratch_ answered.
-Result<Done> BlockingConnection::keep(ssize_t got) {
     if (got == 0 || (got < 0 && errno == ECONNRESET)) {
         return closedFailure();
     }
@@ -161,7 +191,7 @@ Result<Done> BlockingConnection::keep(ssize_t got) {
         return systemFailure("reading from the service", errno);
     }
     received_.append(scratch_.data(), static_cast<std::size_t>(got));
-    return Done();
+    return authenticated_ ? takeApart() : Done();
 }
 
 Result<Done> BlockingConnection::takeApart() {

@@ -9,6 +9,7 @@
 #include "platform/dbus/MessageWriter.h"
 #include "platform/linux/FileDescriptor.h"
 
+#include <chrono>
 #include <cstdint>
 #include <deque>
 #include <memory>
@@ -39,8 +40,9 @@ public:
     /// The serial for the next call, never 0 and never the same again.
     std::uint32_t nextSerial() { return ++serial_ == 0 ? ++serial_ : serial_; }
 
-    /// Sends the bytes of whole messages, taking in replies meanwhile. They may wait as long as they like.
-    Result<Done> send(std::string_view bytes);
+    /// Sends the bytes of whole messages, taking in replies meanwhile. Fails when the service closes the connection
+    /// (code ECONNRESET) or takes no byte in for `patience` (code ETIMEDOUT); a part may have been sent then.
+    Result<Done> send(std::string_view bytes, Nanoseconds patience = kSendPatience);
 
     /// The reply to the call `serial`, in whatever order replies come. Fails when the service closes the connection
     /// (code ECONNRESET) or says nothing for `patience` (code ETIMEDOUT).
@@ -49,16 +51,20 @@ public:
     /// Whether a reply to the call has come in already.
     bool hasReply(std::uint32_t serial) const;
 
+    /// Waits until something comes in, be it a part of a reply, and answers true; false when nothing has come for
+    /// `patience`. Fails when the service closes the connection (code ECONNRESET).
+    Result<bool> takeIn(Nanoseconds patience);
+
 private:
     explicit BlockingConnection(FileDescriptor descriptor) : descriptor_(std::move(descriptor)) {}
 
     Result<Done> authenticate(Nanoseconds patience);
-    Result<Done> takeIn(Nanoseconds patience);
+    Result<Done> waitForRoom(Nanoseconds patience);
     Result<Done> takeWhatIsThere();
-    Result<Done> keep(ssize_t got);
     Result<Done> takeApart();
 
     static constexpr std::size_t kReadBytes = 16 * 1024;
+    static constexpr std::chrono::seconds kSendPatience{30};
 
     FileDescriptor descriptor_;
     bool authenticated_ = false; ///< what comes in are messages

@@ -3,7 +3,6 @@
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
-#include <filesystem>
 #include <sys/file.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -50,13 +49,17 @@ Result<Done> removeStale(const std::string& path, const sockaddr_un& address) {
     return Done();
 }
 
-/// Keeps other services that start in the same folder out until the descriptor is closed.
-Result<FileDescriptor> lockFolder(const std::string& path) {
-    const std::filesystem::path parent = std::filesystem::path(path).parent_path();
-    const std::string folder = parent.empty() ? "." : parent.string();
-    FileDescriptor descriptor(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (!descriptor || flock(descriptor.get(), LOCK_EX) != 0) {
-        return Failure{errno, "cannot lock the folder " + folder};
+/// Keeps other services that start at the same path out until the descriptor is closed. A file that nobody else may
+/// open: whoever can open one can lock it, for as long as he likes.
+Result<FileDescriptor> lockBeside(const std::string& path) {
+    const std::string name = path + ".lock";
+    FileDescriptor descriptor(open(name.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, S_IRUSR | S_IWUSR));
+    int locked = -1;
+    do {
+        locked = descriptor ? flock(descriptor.get(), LOCK_EX) : -1;
+    } while (descriptor && locked != 0 && errno == EINTR);
+    if (locked != 0) {
+        return Failure{errno, "cannot lock " + name};
     }
     return descriptor;
 }
@@ -86,7 +89,7 @@ Result<ListeningSocket> ListeningSocket::create(const std::string& path, unsigne
     }
     std::memcpy(address.sun_path, path.data(), path.size());
     // From the look at what stands there until the new socket does, nobody else may do the same.
-    auto lock = lockFolder(path);
+    auto lock = lockBeside(path);
     if (!lock) {
         return lock.failure();
     }

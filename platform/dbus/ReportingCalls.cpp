@@ -8,6 +8,9 @@ namespace vela::platform::dbus {
 
 namespace {
 
+/// That one message is for: each that is not there costs an error line.
+constexpr std::size_t kMostReporters = 1024;
+
 using Run = void (*)(CallTarget&, const MessageHeader&, BodyReader&, PendingCall);
 
 /// Whether there is an object to call; if not, `call` was answered so.
@@ -74,10 +77,16 @@ void sendMessage(CallTarget& target, const MessageHeader&, BodyReader& body, Pen
     const std::uint32_t category = body.uint32();
     const std::uint16_t type = body.uint16();
     auto reportingIDs = body.optionalInt64s();
-    if (ready(target, body, call)) {
-        target.object->sendMessage(std::move(message), category, type, std::move(reportingIDs),
-                                   emptyReply(std::move(call)));
+    if (!ready(target, body, call)) {
+        return;
     }
+    if (reportingIDs && reportingIDs->size() > kMostReporters) {
+        return call.answerError(kLimitsExceededError, "a message may name " + std::to_string(kMostReporters) +
+                                                          " reporters: this one names " +
+                                                          std::to_string(reportingIDs->size()));
+    }
+    target.object->sendMessage(std::move(message), category, type, std::move(reportingIDs),
+                               emptyReply(std::move(call)));
 }
 
 void stopReportingSessionForID(CallTarget& target, const MessageHeader&, BodyReader& body, PendingCall call) {

@@ -5,6 +5,7 @@
 #include <fcntl.h>
 #include <filesystem>
 #include <fstream>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 
@@ -358,6 +359,16 @@ TEST(ServiceEndpointLifeTest, ASocketThatNobodyListensAtIsReplaced) {
     const auto endpoint = DbusServiceEndpoint::open(optionsAt(path));
     ASSERT_TRUE(endpoint) << endpoint.failure().description;
     RawClient client(path);
+}
+
+TEST(ServiceEndpointLifeTest, WhoeverLocksTheFolderKeepsNobodyFromStarting) {
+    const vela::testing::TemporaryFolder folder;
+    const FileDescriptor held(open(folder.path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    ASSERT_EQ(flock(held.get(), LOCK_EX), 0);
+    EXPECT_TRUE(DbusServiceEndpoint::open(optionsAt(folder / "socket")));
+    struct stat lock {};
+    ASSERT_EQ(stat((folder / "socket.lock").c_str(), &lock), 0);
+    EXPECT_EQ(lock.st_mode & 0777U, 0600U) << "nobody else may lock that one";
 }
 
 TEST(ServiceEndpointLifeTest, AFileThatIsNoSocketStays) {

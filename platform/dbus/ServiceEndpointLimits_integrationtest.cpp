@@ -83,6 +83,18 @@ TEST(ServiceEndpointLimitsTest, ThirtyTwoContainersInsideEachOtherAreTaken) {
     EXPECT_THAT(client.call(sendMessageCall({{"k", message}}, std::nullopt)).error(), HasSubstr("limits.value_depth"));
 }
 
+TEST(ServiceEndpointLimitsTest, AMessageNamesSoManyReportersAtTheMost) {
+    RunningEndpoint endpoint;
+    RawClient client = endpoint.client();
+    const auto send = [&client](std::size_t reporters) {
+        return client.call(sendMessageCall({{"k", 1}}, std::vector<std::int64_t>(reporters, 42))).error();
+    };
+    EXPECT_EQ(send(1024), "");
+    EXPECT_EQ(send(1025), "org.freedesktop.DBus.Error.LimitsExceeded: a message may name 1024 reporters: this one "
+                          "names 1025");
+    EXPECT_EQ(endpoint.service->messages().size(), 1U);
+}
+
 TEST(ServiceEndpointLimitsTest, SessionsOfOneClientAreCounted) {
     DbusServiceOptions options;
     options.sessionsPerClient = 2;

@@ -202,7 +202,7 @@ TEST_F(JournalLogTest, WhatIsTooLargeForADatagramGoesByASealedFile) {
     ASSERT_EQ(fields.size(), 8U);
     EXPECT_EQ(fields[0].first, "MESSAGE");
     EXPECT_TRUE(fields[0].second == text);
-    EXPECT_THAT(fields[6], Pair("CODE_LINE", "42"));
+    EXPECT_THAT(fields[7], Pair("CODE_LINE", "42"));
     EXPECT_EQ(log->lost(), 0U);
 }
 

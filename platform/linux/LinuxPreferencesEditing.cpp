@@ -47,6 +47,17 @@ Result<Done> LinuxPreferencesEditing::write(std::string_view domain, std::string
 }
 
 Result<bool> LinuxPreferencesEditing::remove(std::string_view domain, std::string_view key) {
+    return removeFrom(domain, [key](const Dictionary& content) {
+        return content.contains(key) ? content.removing(Key(key)) : content;
+    });
+}
+
+Result<bool> LinuxPreferencesEditing::removeAll(std::string_view domain) {
+    return removeFrom(domain, [](const Dictionary&) { return Dictionary(); });
+}
+
+Result<bool> LinuxPreferencesEditing::removeFrom(std::string_view domain,
+                                                 const std::function<Dictionary(const Dictionary&)>& rest) {
     const FolderLock lock(preferences_.folder());
     if (!lock && errno != ENOENT) {
         return notLocked(preferences_.folder());
@@ -55,10 +66,11 @@ Result<bool> LinuxPreferencesEditing::remove(std::string_view domain, std::strin
     if (!content) {
         return content.failure();
     }
-    if (!content->contains(key)) {
+    const Dictionary left = rest(*content);
+    if (left.size() == content->size()) {
         return false;
     }
-    const Result<Done> replaced = replace(domain, content->removing(Key(key)));
+    const Result<Done> replaced = replace(domain, left);
     return replaced ? Result<bool>(true) : Result<bool>(replaced.failure());
 }
 

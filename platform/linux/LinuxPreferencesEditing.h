@@ -4,6 +4,7 @@
 
 #include "platform/linux/LinuxPreferences.h"
 
+#include <functional>
 #include <string>
 #include <string_view>
 
@@ -28,7 +29,12 @@ public:
     /// Takes `key` away; false when it is not there. A file that has nothing left stays, as an empty dictionary.
     Result<bool> remove(std::string_view domain, std::string_view key);
 
+    /// Takes every key of the domain away, at once; false when it has none.
+    Result<bool> removeAll(std::string_view domain);
+
 private:
+    /// Replaces the domain's file by what `rest` leaves of it; false when that is everything.
+    Result<bool> removeFrom(std::string_view domain, const std::function<Dictionary(const Dictionary&)>& rest);
     Result<Done> replace(std::string_view domain, const Dictionary& content);
 
     const LinuxPreferences preferences_;

@@ -172,6 +172,34 @@ TEST_F(LinuxPreferencesTest, TheLastKeyLeavesAnEmptyFile) {
     EXPECT_EQ(*editing_.readAll("com.orvex.audio"), Dictionary());
 }
 
+TEST_F(LinuxPreferencesTest, AllKeysAreRemovedAtOnceAndAnEmptyFileStays) {
+    writeFile("{ a = x; level = 3; }");
+    const auto removed = editing_.removeAll("com.orvex.audio");
+    ASSERT_TRUE(removed);
+    EXPECT_TRUE(*removed);
+    EXPECT_TRUE(std::filesystem::exists(path()));
+    EXPECT_EQ(*editing_.readAll("com.orvex.audio"), Dictionary());
+    const auto again = editing_.removeAll("com.orvex.audio");
+    ASSERT_TRUE(again);
+    EXPECT_FALSE(*again);
+}
+
+TEST_F(LinuxPreferencesTest, RemovingAllTouchesNoOtherDomainAndNoBrokenFile) {
+    ASSERT_TRUE(editing_.write("com.orvex.vela", "a", 1));
+    writeFile("{ level = 3;");
+    EXPECT_FALSE(editing_.removeAll("com.orvex.audio"));
+    EXPECT_EQ(*files_.readFile(path(), 100), "{ level = 3;");
+    EXPECT_EQ(*editing_.readAll("com.orvex.vela"), (Dictionary{{"a", 1}}));
+    EXPECT_EQ(editing_.removeAll("../x").failure().code, EINVAL);
+}
+
+TEST_F(LinuxPreferencesTest, WithoutAFolderThereIsNothingToRemoveAtAll) {
+    const auto removed = editing_.removeAll("com.orvex.audio");
+    ASSERT_TRUE(removed);
+    EXPECT_FALSE(*removed);
+    EXPECT_FALSE(std::filesystem::exists(folder_ / "preferences"));
+}
+
 TEST_F(LinuxPreferencesTest, AFolderThatCannotBeMadeIsAFailure) {
     ASSERT_TRUE(files_.writeFileAtomically(folder_ / "preferences", "in the way", 0644));
     EXPECT_EQ(editing_.write("com.orvex.audio", "level", 1).failure().code, ENOTDIR);
