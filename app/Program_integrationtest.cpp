@@ -19,7 +19,7 @@ protected:
         std::vector<std::string> all{VELA_REPORTINGD};
         all.insert(all.end(), arguments.begin(), arguments.end());
         return testing::runProgram(
-            std::move(all), {"HOME=" + folder_.path(), "XDG_RUNTIME_DIR=" + folder_.path(), "PATH=/usr/bin:/bin"});
+            all, {"HOME=" + folder_.path(), "XDG_RUNTIME_DIR=" + folder_.path(), "PATH=/usr/bin:/bin"});
     }
     /// `--check` on folders of this test's own.
     testing::ProgramRun check(const std::vector<std::string>& arguments) {

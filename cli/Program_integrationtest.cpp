@@ -28,7 +28,7 @@ protected:
     testing::ProgramRun run(const std::vector<std::string>& arguments) {
         std::vector<std::string> all{VELACTL};
         all.insert(all.end(), arguments.begin(), arguments.end());
-        return testing::runProgram(std::move(all), {"HOME=/home/u", "XDG_RUNTIME_DIR=/run/user/7"});
+        return testing::runProgram(all, {"HOME=/home/u", "XDG_RUNTIME_DIR=/run/user/7"});
     }
     std::string file() const { return folder_ / "v.toml"; }
 
