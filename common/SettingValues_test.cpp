@@ -81,7 +81,7 @@ TEST(SettingTextTest, OtherCharactersStayAndBytesThatAreNoneBecomeTheReplacement
 }
 
 TEST(SettingTextTest, CharactersThatChangeHowOthersAreShownAreEscaped) {
-    EXPECT_EQ(quotedText("\u202e\u2066\u200f\u2028"), R"("\u202e\u2066\u200f\u2028")");
+    EXPECT_EQ(quotedText("\u202e\u202c\u2066\u2069\u200f\u2028"), R"("\u202e\u202c\u2066\u2069\u200f\u2028")");
     EXPECT_EQ(quotedText("\u200d\u2014\u2065"), "\"\u200d\u2014\u2065\"");
 }
 

@@ -20,7 +20,7 @@ namespace {
 
 struct LinuxHarness {
     const Preferences& preferences() { return preferences_; }
-    void set(std::string_view domain, std::string_view key, Value value) {
+    void set(std::string_view domain, std::string_view key, const Value& value) {
         EXPECT_TRUE(editing_.write(domain, key, value));
     }
     void remove(std::string_view domain, std::string_view key) {
@@ -208,8 +208,10 @@ TEST_F(LinuxPreferencesTest, AFolderThatCannotBeMadeIsAFailure) {
 }
 
 TEST_F(LinuxPreferencesTest, NoWriterLosesAnothersKey) {
+    constexpr int kWriters = 4;
     std::vector<std::thread> writers;
-    for (int writer = 0; writer < 4; ++writer) {
+    writers.reserve(kWriters);
+    for (int writer = 0; writer < kWriters; ++writer) {
         writers.emplace_back([this, writer] {
             for (int number = 0; number < 10; ++number) {
                 EXPECT_TRUE(editing_.write("com.orvex.audio", std::to_string(10 * writer + number), number));
