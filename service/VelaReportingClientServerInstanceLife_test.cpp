@@ -61,6 +61,18 @@ TEST_F(VelaReportingClientServerInstanceStepsTest, AStopTakesItsStepsInOrder) {
     EXPECT_EQ(hadSnapShot, false);
 }
 
+TEST_F(VelaReportingClientServerInstanceStepsTest, AStopAnswersAStartThatWaitsBehindTheCountAndBeforeTheLine) {
+    fakes_.beacon.setDiscovery(BeaconDiscovery::Waits);
+    client_.create(42);
+    client_.operations().startReportingSessionForID(
+        42, nullptr, [this](const std::optional<platform::IpcError>&, bool) { steps_.emplace_back("start replied"); });
+    queues_.runUntilIdle();
+    steps();
+    client_.stop(42);
+    EXPECT_THAT(steps(), ElementsAre("driver logs 42, blocking", "session stops, blocking", "count 0", "start replied",
+                                     "active"));
+}
+
 TEST_F(VelaReportingClientServerInstanceLifeTest, APendingStartIsAnsweredBeforeItsStop) {
     fakes_.beacon.setDiscovery(BeaconDiscovery::Waits);
     const Client client = connect(7);

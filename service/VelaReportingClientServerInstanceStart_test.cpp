@@ -96,6 +96,19 @@ TEST_F(VelaReportingClientServerInstanceStartStepsTest, AStartTakesItsStepsInOrd
     EXPECT_TRUE(client_.session(42)->driverSnapShot().has_value());
 }
 
+TEST_F(VelaReportingClientServerInstanceStartStepsTest, ATestSessionIsAnsweredBetweenTheFeaturesAndTheCount) {
+    fakes_.device.setFeature("AudioAnalytics", "Tracing", true);
+    recordingDelegate_->features = Dictionary{{"ringerstate", true}};
+    client_.create(42);
+    client_.setServiceType(AudioServiceTypeTest, 42);
+    steps();
+    client_.operations().startReportingSessionForID(
+        42, nullptr, [this](const std::optional<platform::IpcError>&, bool) { steps_.emplace_back("reply"); });
+    queues_.runNext();
+    EXPECT_THAT(steps(), ElementsAre("count 1", "session starts", "snapshot, blocking", "features", "session sends",
+                                     "reply", "active"));
+}
+
 TEST_F(VelaReportingClientServerInstanceStartStepsTest, WithTheLogOffNobodyGathersTheActiveSessions) {
     client_.create(42);
     setLogDestination(&log_, LogLevel::Error);
