@@ -102,6 +102,29 @@ TEST_F(VelaReportingServiceDelegateFeaturesTest, ARingerThatCouldNotBeRegistered
 
 // The state.
 
+TEST_F(VelaReportingServiceDelegateFeaturesTest, AnEntryThatIsNotRegisteredYetAddsNothing) {
+    setRinger(1);
+    setDeviceName("Kitchen");
+    std::vector<std::string> told;
+    fakes_.notifications.setObserver([&](std::string_view name) {
+        if (name != kRinger) {
+            return;
+        }
+        log_.clear();
+        post(kDevice);
+        for (const CapturedLine& line : log_.lines()) {
+            if (line.message.starts_with("defaults ")) {
+                told.push_back(line.message);
+            }
+        }
+    });
+    service();
+    ASSERT_EQ(told.size(), 1U);
+    EXPECT_THAT(told[0], ::testing::HasSubstr("device_name = Kitchen"));
+    EXPECT_THAT(told[0], ::testing::Not(::testing::HasSubstr("ringerstate")));
+    EXPECT_TRUE(state()->contains("ringerstate"));
+}
+
 TEST_F(VelaReportingServiceDelegateFeaturesTest, WithoutAnyStateThereIsNone) {
     service();
     log_.clear();

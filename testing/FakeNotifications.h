@@ -7,6 +7,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <memory>
 #include <optional>
@@ -50,6 +51,8 @@ public:
         const MutexLock lock(mutex_);
         failures_[std::string(name)] = status;
     }
+    /// Called with each name before it is registered for, without a lock.
+    void setObserver(std::function<void(std::string_view name)> observer) { observer_ = std::move(observer); }
     /// What is registered now, oldest first.
     std::vector<Registration> registrations() const {
         const MutexLock lock(mutex_);
@@ -63,6 +66,9 @@ public:
     platform::NotificationRegistration
     registerForNotification(std::string_view name, platform::WorkQueue& queue,
                             platform::UniqueFunction<void(std::int32_t token)> handler) override {
+        if (observer_) {
+            observer_(name);
+        }
         const MutexLock lock(mutex_);
         const auto failure = failures_.find(std::string(name));
         if (failure != failures_.end() && failure->second != 0) {
@@ -95,6 +101,8 @@ public:
     }
 
 private:
+    std::function<void(std::string_view name)> observer_; // set before it is used
+
     struct Entry {
         Entry(std::string itsName, platform::WorkQueue& itsQueue,
               platform::UniqueFunction<void(std::int32_t token)> itsHandler)
