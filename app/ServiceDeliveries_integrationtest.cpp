@@ -107,6 +107,18 @@ protected:
     RunningService service_;
 };
 
+TEST_F(ServiceDeliveriesTest, TheTimeOfAClientThatHasGoneIsAnAnalyticsEvent) {
+    EXPECT_EQ(service_.velactl({"call", "getAllReporters"}).status, 0);
+    std::vector<std::string> events;
+    EXPECT_TRUE(testing::waitUntil([&] {
+        events = deliveries({"--backend", "tally"});
+        return !events.empty();
+    }));
+    ASSERT_EQ(events.size(), 1U);
+    EXPECT_THAT(events[0], HasSubstr("\"name\":\"com.orvex.vela.velareportingclientuptime\""));
+    EXPECT_THAT(events[0], HasSubstr("{\"processName\":\"velactl\",\"seconds\":"));
+}
+
 TEST_F(ServiceDeliveriesTest, AMessageGoesToEveryBackEndThatWantsIt) {
     ServiceClient client = service_.client();
     startSession(client);
