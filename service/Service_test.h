@@ -231,7 +231,7 @@ protected:
     }
     /// A registered client. What that logged is forgotten.
     Client connect(std::int32_t pid) {
-        const Client client = accept(pid);
+        Client client = accept(pid);
         queues_.runUntilIdle();
         log_.clear();
         return client;

@@ -11,7 +11,7 @@ using ::testing::IsEmpty;
 class VelaReportingClientServerInstanceMessagesTest : public ServiceTest {
 protected:
     std::shared_ptr<Answer<>> beginSend(const Client& client, std::uint16_t type, ReporterIDs reporterIDs) {
-        const auto answer = newAnswer<>();
+        auto answer = newAnswer<>();
         client.operations().sendMessage({{"Haptic_Active_Hardware_Time_Seconds", 1}}, 4, type, std::move(reporterIDs),
                                         Answer<>::into(answer));
         return answer;

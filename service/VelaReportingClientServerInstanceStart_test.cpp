@@ -13,7 +13,7 @@ protected:
     /// The call alone: its reply may be seconds away.
     std::shared_ptr<Answer<bool>> beginStart(const Client& client, std::int64_t reporterID,
                                              std::shared_ptr<void> underWay = nullptr) {
-        const auto answer = newAnswer<bool>();
+        auto answer = newAnswer<bool>();
         client.operations().startReportingSessionForID(reporterID, std::move(underWay), Answer<bool>::into(answer));
         queues_.runUntilIdle();
         return answer;

@@ -291,8 +291,8 @@ TEST_F(VelaReportingClientServerInstanceDeathTest, KillServiceEndsTheProcessWith
         // Its line goes to standard error, where the test sees it.
         struct StandardError final : platform::LogSink {
             void write(const platform::LogRecord& record) override {
-                std::fprintf(stderr, "%d %.*s\n", static_cast<int>(record.level),
-                             static_cast<int>(record.message.size()), record.message.data());
+                static_cast<void>(std::fprintf(stderr, "%d %.*s\n", static_cast<int>(record.level),
+                                               static_cast<int>(record.message.size()), record.message.data()));
             }
             std::uint64_t lost() const override { return 0; }
         };
